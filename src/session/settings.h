@@ -1,5 +1,24 @@
 // Setters that configure a session. Invalid values are dropped silently; none touches the
 // typed text. The JNI layer converts managed arguments and calls these one to one.
+//
+// Every stored string is a private malloc'd copy; replacing one wipes and frees the old copy.
+// Rules worth knowing at the call site:
+//   setMaxLength     negative ignored; values above the 4092-character capacity are stored as
+//                    4092, so key entry (which checks only maxLength) can never pass the buffer.
+//   setKbdStyle      kbdPage = style / 2, shiftOn = style % 2 with C semantics (style -1 gives
+//                    page 0 and shiftOn 0xFFFFFFFF, i.e. shifted).
+//   setSwitchMode,
+//   setFinishMode    the value as unsigned 16-bit if below 2, else 0.
+//   setMode          only 0, 1 and 4 are stored.
+//   setChallengeCode only a non-empty text replaces; setAlgorithmCode likewise.
+//   setKbdFactor     "0..." kind 0, "1..." kind 1 (an earlier buffer stays), anything else
+//                    kind 2 with the text after its first character; null or empty ignored.
+//   setHashRandom    "1:salt" / "2:salt" -> "::::::::::salt::::::::::S" / "...F"; others ignored.
+//   setXxxPlat       isDer false: the hex modulus as given; true: the modulus read from DER hex,
+//                    or null when the DER is refused (the old key is dropped either way).
+//   setXxxPlatBlob   blob hex (white space skipped) minus its 20-byte header, bytes reversed,
+//                    then the DER path.
+//   setEccKey        "x,y", sized from both lengths; 0 when x or y is null or memory runs out.
 #pragma once
 
 #include <cstdint>
