@@ -1,0 +1,43 @@
+// OpenSSL-backed oracles for the dispatcher and server-side suites (test-only): digests, two-key
+// triple DES, base64, an envelope assembled from its parts, and an in-process run of the
+// tessel_open command line in a child process.
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <vector>
+
+#include "server/envelope.h"
+#include "support/openssl_oracle.h"
+
+namespace tessel::test {
+
+std::string opensslMd5Hex(const std::string& data);  // lower case
+Bytes opensslSha1(const std::string& data);
+// Two-key triple DES (DES-EDE) in ECB over whole blocks, no padding.
+Bytes opensslDesEde(const Bytes& key16, const Bytes& data, bool encrypt);
+std::string opensslBase64(const Bytes& data);
+// Throws on text that is not canonical base64.
+Bytes opensslBase64Decode(const std::string& text);
+// PKCS#1 v1.5 encryption (random padding) and raw RSA under the key's public half.
+Bytes opensslPkcs1Encrypt(const server::PrivateKey& key, const Bytes& message);
+Bytes opensslRawEncrypt(const server::PrivateKey& key, const Bytes& block);
+
+// The digital envelope built with OpenSSL alone: "%08d"(k+12), SIMPLEBLOB header, the RSA value
+// of rc4Key reversed, "%08d"(L), RC4 after `drop` bytes. wrappedKey (k bytes, big-endian) is
+// used when given, else OpenSSL's own PKCS#1 encryption of rc4Key.
+std::string opensslEnvelope(const server::PrivateKey& key, const Bytes& rc4Key, std::size_t drop,
+                            const std::string& content, const Bytes& wrappedKey = Bytes());
+
+// The salted-hash value of the hashed types, from OpenSSL's MD5.
+std::string expectedSaltedHash(const std::string& password, const std::string& salt, char mode);
+
+// Runs tessel_open's command line in a forked child: exit status (or -signal) and both streams.
+struct CliRun {
+  int status = 0;
+  std::string out;
+  std::string err;
+};
+CliRun runOpenCli(const std::vector<std::string>& args, const std::string& input = std::string());
+
+}  // namespace tessel::test
