@@ -10,9 +10,9 @@
 // the routines that made them (their temporaries) and by the RSA layer (its operands); a caller
 // holding a secret BigNumber wipes it with wipeObject.
 //
-// Refusals are reported as `false` (the output is then unspecified but fully initialised):
-// digits outside the radix, an empty text, a value wider than 2240 bits, division by zero,
-// a zero modulus.
+// Refusals are reported as `false`, the output then holding zero or a partial value (never
+// uninitialised memory): digits outside the radix, an empty text, a value wider than 2240
+// bits, division by zero, a zero modulus.
 #pragma once
 
 #include <cstddef>

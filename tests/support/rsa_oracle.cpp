@@ -95,7 +95,7 @@ std::string RsaTestKey::publicDerHex() const {
   unsigned char* der = nullptr;
   std::size_t len = 0;
   OSSL_ENCODER_CTX* ectx = OSSL_ENCODER_CTX_new_for_pkey(key_->pkey, EVP_PKEY_PUBLIC_KEY, "DER",
-                                                         "type-specific", nullptr);
+                                                         "pkcs1", nullptr);
   if (ectx == nullptr || !OSSL_ENCODER_to_data(ectx, &der, &len)) {
     OSSL_ENCODER_CTX_free(ectx);
     fail("public DER");

@@ -1,0 +1,144 @@
+// SHA-1 (FIPS 180-4): portable compression with the message schedule kept as a rolling
+// 16-word window, fully unrolled so the round functions and constants are fixed per step.
+// The context holds message-derived state: sha1() wipes its own, callers wipe theirs.
+#include "crypto/sha1.h"
+
+#include <cstring>
+
+#include "crypto/wipe.h"
+
+namespace tessel {
+namespace {
+
+inline std::uint32_t rol(std::uint32_t x, int n) { return (x << n) | (x >> (32 - n)); }
+
+inline std::uint32_t load32be(const std::uint8_t* p) {
+  return (std::uint32_t{p[0]} << 24) | (std::uint32_t{p[1]} << 16) | (std::uint32_t{p[2]} << 8) | p[3];
+}
+
+inline void store32be(std::uint8_t* p, std::uint32_t v) {
+  p[0] = static_cast<std::uint8_t>(v >> 24);
+  p[1] = static_cast<std::uint8_t>(v >> 16);
+  p[2] = static_cast<std::uint8_t>(v >> 8);
+  p[3] = static_cast<std::uint8_t>(v);
+}
+
+// W[t] for t >= 16 overwrites W[t - 16] in the 16-word window.
+#define SHA1_W(t) (w[(t) & 15] = rol(w[((t) + 13) & 15] ^ w[((t) + 8) & 15] ^ w[((t) + 2) & 15] ^ w[(t) & 15], 1))
+#define SHA1_F1(b, c, d) ((d) ^ ((b) & ((c) ^ (d))))
+#define SHA1_F2(b, c, d) ((b) ^ (c) ^ (d))
+#define SHA1_F3(b, c, d) (((b) & (c)) | ((d) & ((b) | (c))))
+#define SHA1_STEP(f, k, a, b, c, d, e, x) \
+  do {                                    \
+    (e) += rol(a, 5) + f(b, c, d) + (k) + (x); \
+    (b) = rol(b, 30);                     \
+  } while (0)
+
+void compress(std::uint32_t state[5], const std::uint8_t* block, std::size_t blocks) noexcept {
+  std::uint32_t w[16];
+  for (; blocks > 0; --blocks, block += 64) {
+    std::uint32_t a = state[0], b = state[1], c = state[2], d = state[3], e = state[4];
+    for (int t = 0; t < 16; ++t) w[t] = load32be(block + 4 * t);
+    // Rounds 0-15 read the block words, 16-79 the rolling schedule; the five registers rotate
+    // names instead of values.
+#define R0(a, b, c, d, e, t) SHA1_STEP(SHA1_F1, 0x5A827999u, a, b, c, d, e, w[t])
+#define R1(a, b, c, d, e, t) SHA1_STEP(SHA1_F1, 0x5A827999u, a, b, c, d, e, SHA1_W(t))
+#define R2(a, b, c, d, e, t) SHA1_STEP(SHA1_F2, 0x6ED9EBA1u, a, b, c, d, e, SHA1_W(t))
+#define R3(a, b, c, d, e, t) SHA1_STEP(SHA1_F3, 0x8F1BBCDCu, a, b, c, d, e, SHA1_W(t))
+#define R4(a, b, c, d, e, t) SHA1_STEP(SHA1_F2, 0xCA62C1D6u, a, b, c, d, e, SHA1_W(t))
+#define FIVE(R, t)         \
+  R(a, b, c, d, e, t);     \
+  R(e, a, b, c, d, t + 1); \
+  R(d, e, a, b, c, t + 2); \
+  R(c, d, e, a, b, t + 3); \
+  R(b, c, d, e, a, t + 4)
+    FIVE(R0, 0); FIVE(R0, 5); FIVE(R0, 10);
+    R0(a, b, c, d, e, 15); R1(e, a, b, c, d, 16); R1(d, e, a, b, c, 17); R1(c, d, e, a, b, 18);
+    R1(b, c, d, e, a, 19);
+    FIVE(R2, 20); FIVE(R2, 25); FIVE(R2, 30); FIVE(R2, 35);
+    FIVE(R3, 40); FIVE(R3, 45); FIVE(R3, 50); FIVE(R3, 55);
+    FIVE(R4, 60); FIVE(R4, 65); FIVE(R4, 70); FIVE(R4, 75);
+#undef FIVE
+#undef R0
+#undef R1
+#undef R2
+#undef R3
+#undef R4
+    state[0] += a;
+    state[1] += b;
+    state[2] += c;
+    state[3] += d;
+    state[4] += e;
+  }
+  secureWipe(w, sizeof(w));
+}
+
+}  // namespace
+
+void sha1Init(Sha1Context& ctx) noexcept {
+  ctx.state[0] = 0x67452301u;
+  ctx.state[1] = 0xEFCDAB89u;
+  ctx.state[2] = 0x98BADCFEu;
+  ctx.state[3] = 0x10325476u;
+  ctx.state[4] = 0xC3D2E1F0u;
+  ctx.lengthLow = ctx.lengthHigh = 0;
+  std::memset(ctx.block, 0, sizeof(ctx.block));
+}
+
+void sha1Update(Sha1Context& ctx, const void* data, std::uint32_t length) noexcept {
+  if (length == 0) return;
+  const std::uint8_t* p = static_cast<const std::uint8_t*>(data);
+  std::size_t used = (ctx.lengthLow >> 3) & 63;
+  const std::uint64_t bits = (static_cast<std::uint64_t>(ctx.lengthHigh) << 32 | ctx.lengthLow) +
+                             (static_cast<std::uint64_t>(length) << 3);
+  ctx.lengthLow = static_cast<std::uint32_t>(bits);
+  ctx.lengthHigh = static_cast<std::uint32_t>(bits >> 32);
+  std::size_t left = length;
+  if (used != 0) {
+    const std::size_t take = left < 64 - used ? left : 64 - used;
+    std::memcpy(ctx.block + used, p, take);
+    used += take;
+    p += take;
+    left -= take;
+    if (used < 64) return;
+    compress(ctx.state, ctx.block, 1);
+  }
+  if (left >= 64) {
+    compress(ctx.state, p, left / 64);
+    p += left & ~std::size_t{63};
+    left &= 63;
+  }
+  if (left != 0) std::memcpy(ctx.block, p, left);
+}
+
+void sha1Final(Sha1Context& ctx, std::uint8_t digest[20]) noexcept {
+  std::size_t used = (ctx.lengthLow >> 3) & 63;
+  ctx.block[used++] = 0x80;
+  if (used > 56) {
+    std::memset(ctx.block + used, 0, 64 - used);
+    compress(ctx.state, ctx.block, 1);
+    used = 0;
+  }
+  std::memset(ctx.block + used, 0, 56 - used);
+  store32be(ctx.block + 56, ctx.lengthHigh);
+  store32be(ctx.block + 60, ctx.lengthLow);
+  compress(ctx.state, ctx.block, 1);
+  for (int i = 0; i < 5; ++i) store32be(digest + 4 * i, ctx.state[i]);
+}
+
+void sha1(const void* data, std::size_t length, std::uint8_t digest[20]) noexcept {
+  Sha1Context ctx;
+  sha1Init(ctx);
+  const std::uint8_t* p = static_cast<const std::uint8_t*>(data);
+  // Updates take 32-bit lengths; feed anything longer in slices.
+  while (length > 0) {
+    const std::uint32_t n = length > 0x40000000u ? 0x40000000u : static_cast<std::uint32_t>(length);
+    sha1Update(ctx, p, n);
+    p += n;
+    length -= n;
+  }
+  sha1Final(ctx, digest);
+  wipeObject(ctx);
+}
+
+}  // namespace tessel
