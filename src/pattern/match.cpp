@@ -1,0 +1,18 @@
+// wholeMatch: compile-and-match in one call, for the key-press accepts check.
+//
+// The engine and its match context both live on this frame; for everyday patterns neither
+// touches the heap (the arena and the stacks have inline room).
+#include "pattern/match.h"
+
+#include "pattern/pattern_engine.h"
+
+namespace tessel {
+
+bool wholeMatch(const char* pattern, const std::uint8_t* text, std::size_t length) {
+  const PatternEngine engine(pattern);
+  if (!engine.hasTree()) return false;
+  MatchContext context;
+  return engine.matches(text, length, &context);
+}
+
+}  // namespace tessel
