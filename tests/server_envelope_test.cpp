@@ -4,8 +4,6 @@
 #include <gtest/gtest.h>
 
 #include <functional>
-#include <map>
-#include <stdexcept>
 
 #include "server/envelope.h"
 #include "support/dispatch_oracle.h"
@@ -14,21 +12,6 @@ namespace tessel::test {
 namespace {
 
 using server::PrivateKey;
-
-const PrivateKey& loadKey(const char* name) {
-  static std::map<std::string, PrivateKey>* keys = new std::map<std::string, PrivateKey>();
-  auto it = keys->find(name);
-  if (it == keys->end()) {
-    PrivateKey key;
-    std::string error;
-    if (!key.loadPemFile(dataPath(name), &error)) throw std::runtime_error(error);
-    it = keys->emplace(name, std::move(key)).first;
-  }
-  return it->second;
-}
-const PrivateKey& appKey() { return loadKey("dispatch_app_key_1024.pem"); }
-const PrivateKey& encKey() { return loadKey("dispatch_enc_key_2048.pem"); }
-const PrivateKey& foreignKey() { return loadKey("dispatch_foreign_key_1024.pem"); }
 
 const Bytes kRc4Key = fromHex("00112233445566778899aabbccddeeff");
 

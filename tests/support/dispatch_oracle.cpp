@@ -12,11 +12,27 @@
 #include <cstdlib>
 #include <fstream>
 #include <iterator>
+#include <map>
+#include <mutex>
 #include <stdexcept>
 
 #include "server/open_cli.h"
 
 namespace tessel::test {
+
+const server::PrivateKey& testKey(const std::string& fileName) {
+  static std::mutex lock;
+  static auto* keys = new std::map<std::string, server::PrivateKey>();  // process lifetime
+  std::lock_guard<std::mutex> hold(lock);
+  auto it = keys->find(fileName);
+  if (it == keys->end()) {
+    server::PrivateKey key;
+    std::string error;
+    if (!key.loadPemFile(dataPath(fileName), &error)) throw std::runtime_error(error);
+    it = keys->emplace(fileName, std::move(key)).first;
+  }
+  return it->second;
+}
 
 std::string opensslMd5Hex(const std::string& data) {
   unsigned char digest[16];

@@ -12,6 +12,14 @@
 
 namespace tessel::test {
 
+// A private key from tests/data, loaded once per process (throws when it cannot be read).
+const server::PrivateKey& testKey(const std::string& fileName);
+// The dispatcher suites' keys: a 1024-bit application key, a 2048-bit encryption key, and a
+// 1024-bit key that nothing is encrypted for.
+inline const server::PrivateKey& appKey() { return testKey("dispatch_app_key_1024.pem"); }
+inline const server::PrivateKey& encKey() { return testKey("dispatch_enc_key_2048.pem"); }
+inline const server::PrivateKey& foreignKey() { return testKey("dispatch_foreign_key_1024.pem"); }
+
 std::string opensslMd5Hex(const std::string& data);  // lower case
 Bytes opensslSha1(const std::string& data);
 // Two-key triple DES (DES-EDE) in ECB over whole blocks, no padding.
