@@ -1,0 +1,117 @@
+// Texture upload and the three process-wide texture sets. The upload lists follow one fixed
+// order per surface; the glyph entries follow the session's layout.
+#include "render/textures.h"
+
+#include <GLES/gl.h>
+
+#include <cstddef>
+
+#include "render/glyph_index.h"
+#include "session/session.h"
+
+namespace tessel {
+
+namespace {
+
+MainTextureSet gMain;
+PopTextureSet gPop;
+PopTopTextureSet gPopTop;
+
+constexpr int kMaxEntry = 26;
+
+// One upload-list entry: fresh names for `count` textures, stored into `out`, then filled.
+// `imageAt(i)` gives the image of texture i, or null to leave it empty.
+template <typename ImageAt>
+void uploadEntry(TextureName* out, int count, ImageAt imageAt) noexcept {
+  GLuint names[kMaxEntry] = {};
+  glGenTextures(count, names);
+  for (int i = 0; i < count; ++i) out[i] = names[i];
+  for (int i = 0; i < count; ++i)
+    if (const TextureImage* image = imageAt(i)) uploadTexture(names[i], *image);
+}
+
+void uploadGroup(TextureName* out, const ImageGroup& group) noexcept {
+  uploadEntry(out, group.count, [&](int i) { return &group[i]; });
+}
+
+void uploadPlain(TextureName& out, const std::uint8_t* pixels) noexcept {
+  const TextureImage image{0, images::kPlainImageSize, images::kPlainImageSize, pixels, 0};
+  uploadEntry(&out, 1, [&](int) { return &image; });
+}
+
+// The glyph image of a stored layout byte, unmasked only here; null when the character is not
+// in the group (an unbuilt layout holds zero bytes).
+const TextureImage* glyphFor(const ImageGroup& group, std::uint8_t stored, std::uint8_t mask) noexcept {
+  const int index = glyphIndexOf(static_cast<std::uint8_t>(stored + mask));
+  return (index >= 0 && index < group.count) ? &group[index] : nullptr;
+}
+
+const TextureImage* padGlyphFor(std::uint8_t stored, std::uint8_t mask) noexcept {
+  const unsigned index = keypadIndexOf(static_cast<std::uint8_t>(stored + mask));
+  return index < static_cast<unsigned>(images::kPadDigitGlyphs.count) ? &images::kPadDigitGlyphs[static_cast<int>(index)]
+                                                                       : nullptr;
+}
+
+template <std::size_t N>
+void uploadPositional(TextureName* out, int count, const ImageGroup& group,
+                      const RelaxedField<std::uint8_t> (&layout)[N], std::uint8_t mask) noexcept {
+  uploadEntry(out, count, [&](int i) { return glyphFor(group, layout[i], mask); });
+}
+
+}  // namespace
+
+MainTextureSet& mainTextures() noexcept { return gMain; }
+PopTextureSet& popTextures() noexcept { return gPop; }
+PopTopTextureSet& popTopTextures() noexcept { return gPopTop; }
+
+void uploadTexture(std::uint32_t name, const TextureImage& image) noexcept {
+  glBindTexture(GL_TEXTURE_2D, name);
+  glTexParameterf(GL_TEXTURE_2D, GL_TEXTURE_MIN_FILTER, static_cast<GLfloat>(GL_NEAREST));
+  glTexParameterf(GL_TEXTURE_2D, GL_TEXTURE_MAG_FILTER, static_cast<GLfloat>(GL_LINEAR));
+  glTexParameterf(GL_TEXTURE_2D, GL_TEXTURE_WRAP_S, static_cast<GLfloat>(GL_CLAMP_TO_EDGE));
+  glTexParameterf(GL_TEXTURE_2D, GL_TEXTURE_WRAP_T, static_cast<GLfloat>(GL_CLAMP_TO_EDGE));
+  glTexEnvf(GL_TEXTURE_ENV, GL_TEXTURE_ENV_MODE, static_cast<GLfloat>(GL_REPLACE));
+  glTexImage2D(GL_TEXTURE_2D, 0, GL_RGBA, image.width, image.height, 0, GL_RGBA, GL_UNSIGNED_BYTE, image.pixels);
+}
+
+void uploadMainTextures(const KeyboardSession& s) noexcept {
+  MainTextureSet& t = gMain;
+  const std::uint8_t mask = s.keyMask;
+  uploadPlain(t.backgroundTexture, images::kBackgroundPixels);
+  uploadGroup(t.charKeyTextures, images::kCharKeys);
+  uploadPositional(t.letterTextures, 26, images::kLetterGlyphs, s.letters, mask);
+  uploadPositional(t.letterShiftTextures, 26, images::kShiftedLetterGlyphs, s.letters, mask);
+  uploadPositional(t.symbolTextures, 26, images::kSymbolGlyphs, s.symbolsLower, mask);
+  uploadPositional(t.symbolShiftTextures, 26, images::kSymbolShiftGlyphs, s.symbolsUpper, mask);
+  uploadGroup(t.spaceKeyTextures, images::kSpaceKeys);
+  uploadGroup(&t.spaceLabelTexture, images::kSpaceLabel);
+  uploadGroup(t.shiftDeleteKeyTextures, images::kShiftDeleteKeys);
+  uploadGroup(t.switchKeyTextures, images::kSwitchKeys);
+  uploadGroup(t.doneKeyTextures, images::kDoneKeys);
+  uploadGroup(t.iconTextures, images::kIcons);
+  uploadGroup(t.labelTextures, images::kLabels);
+  uploadGroup(t.padKeyTextures, images::kPadKeys);
+  uploadGroup(t.padDoneKeyTextures, images::kPadDoneKeys);
+  uploadGroup(t.padLabelTextures, images::kPadLabels);
+  uploadGroup(&t.padDoneIconTexture, images::kPadDoneIcon);
+  uploadEntry(t.padDigitTextures, 10, [&](int i) { return padGlyphFor(s.padDigits[i], mask); });
+}
+
+void uploadPopTextures() noexcept {
+  PopTextureSet& t = gPop;
+  uploadPlain(t.background, images::kBackgroundPixels);
+  uploadPlain(t.frame, images::kFieldFramePixels);
+  uploadPlain(t.dot, images::kMaskDotPixels);
+  uploadGroup(&t.cursor, images::kCursor);
+  uploadEntry(&t.balloon, 1, [](int) { return &images::kCharKeys[2]; });
+}
+
+void uploadPopTopTextures(const KeyboardSession& s) noexcept {
+  PopTopTextureSet& t = gPopTop;
+  const std::uint8_t mask = s.keyMask;
+  uploadPositional(t.letters, 10, images::kLetterGlyphs, s.letters, mask);
+  uploadPositional(t.shiftedLetters, 10, images::kShiftedLetterGlyphs, s.letters, mask);
+  uploadPositional(t.symbols, 10, images::kSymbolGlyphs, s.symbolsLower, mask);
+}
+
+}  // namespace tessel

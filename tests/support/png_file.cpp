@@ -1,0 +1,25 @@
+// libpng's simplified write API when the tests link libpng; a refusal otherwise.
+#include "support/png_file.h"
+
+#if defined(TESSEL_HAVE_PNG)
+#include <png.h>
+#endif
+
+namespace tessel::test {
+
+bool writePng(const std::string& path, int width, int height, const std::vector<std::uint8_t>& rgba) {
+#if defined(TESSEL_HAVE_PNG)
+  if (width <= 0 || height <= 0 || rgba.size() < static_cast<std::size_t>(width) * height * 4) return false;
+  png_image image{};
+  image.version = PNG_IMAGE_VERSION;
+  image.width = static_cast<png_uint_32>(width);
+  image.height = static_cast<png_uint_32>(height);
+  image.format = PNG_FORMAT_RGBA;
+  return png_image_write_to_file(&image, path.c_str(), 0, rgba.data(), 0, nullptr) != 0;
+#else
+  (void)path, (void)width, (void)height, (void)rgba;
+  return false;
+#endif
+}
+
+}  // namespace tessel::test
