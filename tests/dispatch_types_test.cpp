@@ -298,6 +298,39 @@ TEST_F(DispatchTypes, HashedTypesRefuseMalformedSalts) {
   }
 }
 
+TEST_F(DispatchTypes, CommandLineOpensDeviceOutputs) {
+  const std::string sep = "::::::::::";
+  const std::string appPem = dataPath("dispatch_app_key_1024.pem"), encPem = dataPath("dispatch_enc_key_2048.pem");
+  const std::string hashedText = "Kqhzmw7" + sep + "s4lt" + sep + "S";
+  Dispatched d = dispatch(47, app_.c_str(), enc_.c_str(), hashedText.c_str(), kTimestamp);
+  ASSERT_EQ(d.code, 0);
+  CliRun run = runOpenCli({"--type", "47", "--key", appPem, "--enc-key", encPem, "--password", "Kqhzmw7", "--salt",
+                           "s4lt", "--mode", "S", d.output});
+  EXPECT_EQ(run.status, 0) << run.err;
+  EXPECT_NE(run.out.find("strength: M\ntimestamp: 1700000000\n"), std::string::npos) << run.out;
+  EXPECT_NE(run.out.find("password: match"), std::string::npos) << run.out;
+
+  d = dispatch(5, app_.c_str(), enc_.c_str(), "Kqhzmw7", kTimestamp);
+  run = runOpenCli({"--type", "5", "--key", appPem, "--enc-key", encPem, "--password", "Kqhzmw7", d.output});
+  EXPECT_EQ(run.status, 0) << run.err;
+
+  const Bytes master = configuredMasterKey('7');
+  const Type68Text t = type68Text('7', "739182", master);
+  d = dispatch(68, app_.c_str(), enc_.c_str(), t.text.c_str(), kTimestamp);
+  ASSERT_EQ(d.code, 0);
+  run = runOpenCli({"--type", "68", "--key", appPem, "--enc-key", encPem, "--master-key", toHex(master),
+                    "--wrapped-working-key", t.text.substr(11, 32), "--wrapped-pin-key", t.text.substr(53, 32), d.output});
+  EXPECT_EQ(run.status, 0) << run.err;
+  EXPECT_NE(run.out.find("content: 739182\n"), std::string::npos) << run.out;
+  run = runOpenCli({"--type", "68", "--key", appPem, "--enc-key", encPem, "--pin-key", toHex(bytesOf(t.pinKey)),
+                    d.output});
+  EXPECT_NE(run.out.find("content: 739182\n"), std::string::npos) << run.out;
+  // The envelope under the wrong application key: one line, non-zero.
+  run = runOpenCli({"--type", "68", "--key", dataPath("dispatch_foreign_key_1024.pem"), d.output});
+  EXPECT_EQ(run.status, 1);
+  EXPECT_EQ(run.err.find('\n'), run.err.size() - 1);
+}
+
 // ---- error codes
 
 TEST_F(DispatchTypes, ChecksComeInTheirOrder) {

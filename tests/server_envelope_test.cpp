@@ -205,6 +205,37 @@ TEST(ServerPayloads, PinKeyDerivationOfType68) {
   EXPECT_FALSE(server::derivePinKey68(toHex(master), "zz" + a.substr(2), b, &derived, &error));
 }
 
+TEST(ServerPayloads, PasswordMatchingByType) {
+  server::Opened opened;
+  opened.contentOpened = true;
+  struct Case {
+    int type;
+    std::string content, password, salt;
+    char mode;
+    bool match;
+  };
+  const Case cases[] = {
+      {47, "c359e5975c5a3f45", "pw", "salt", 'S', true},
+      {48, "38b311d8c359e5975c5a3f454d3f4294", "pw", "salt", 'F', true},
+      {48, "38b311d8c359e5975c5a3f454d3f4294", "pw", "salt", 'S', false},
+      {59, "pw", "pw", "", 'S', true},  // no hash random set: the password itself
+      {55, "c359e5975c5a3f45", "pw", "salt", 'X', false},
+      // SHA-1("abc"), FIPS 180-4 example
+      {5, "A9993E364706816ABA3E25717850C26C9CD0D89D", "abc", "", 'S', true},
+      {5, "A9993E364706816ABA3E25717850C26C9CD0D89D", "abd", "", 'S', false},
+      {0, "hello", "hello", "", 'S', true},
+      {0, "hello", "hello!", "", 'S', false},
+      {0, "", "", "", 'S', true},
+  };
+  for (const Case& c : cases) {
+    opened.content = c.content;
+    EXPECT_EQ(server::matchesPassword(c.type, opened, c.password, c.salt, c.mode), c.match)
+        << c.type << " " << c.password;
+  }
+  opened.contentOpened = false;
+  EXPECT_FALSE(server::matchesPassword(0, opened, "hello", "", 'S'));
+}
+
 // ---- the command line
 
 TEST(ServerCli, OpensAnEnvelopeAndChecksTheSaltedHash) {
@@ -214,12 +245,12 @@ TEST(ServerCli, OpensAnEnvelopeAndChecksTheSaltedHash) {
   CliRun run = runOpenCli({"--type", "48", "--key", key, "--password", "pw", "--salt", "salt", envelope});
   EXPECT_EQ(run.status, 0) << run.err;
   EXPECT_EQ(run.out, "strength: W\ntimestamp: 1700000000\npayload: " + value + "\ncontent: " + value +
-                         "\nhash: match\n");
+                         "\npassword: match\n");
   EXPECT_EQ(run.err, "");
 
   run = runOpenCli({"--type", "48", "--key", key, "--password", "pw2", "--salt", "salt", "-"}, envelope + "\n");
   EXPECT_EQ(run.status, 3);
-  EXPECT_NE(run.out.find("hash: mismatch"), std::string::npos);
+  EXPECT_NE(run.out.find("password: mismatch"), std::string::npos);
 
   run = runOpenCli({"--layout", envelope});
   EXPECT_EQ(run.status, 0);
@@ -250,8 +281,8 @@ TEST(ServerCli, BadInputGivesOneLineAndNonZeroExit) {
       {"no output", {"--key", app}, 2},
       {"unknown option", {"--frobnicate", good}, 2},
       {"bad type", {"--type", "x1", good}, 2},
-      {"password without salt", {"--key", app, "--password", "pw", good}, 2},
-      {"password on a text type", {"--type", "0", "--key", app, "--password", "p", "--salt", "s", good}, 2},
+      {"salt without password", {"--key", app, "--salt", "s", good}, 2},
+      {"wrong password", {"--type", "0", "--key", app, "--password", "hellO", good}, 3},
   };
   for (const Case& c : cases) {
     const CliRun run = runOpenCli(c.args);

@@ -638,4 +638,26 @@ bool openOutput(int type, const std::string& output, const OpenKeys& keys, Opene
   return openInner(t.inner, out->payload, *keys.enc, keys, out, error);
 }
 
+bool matchesPassword(int type, const Opened& opened, const std::string& password, const std::string& salt,
+                     char mode) {
+  if (!opened.contentOpened) return false;
+  const Inner inner = typeLayout(type).inner;
+  std::string expected;
+  WipeOnExit w{expected};
+  if ((inner == Inner::Hashed || inner == Inner::HashedRsa) && !salt.empty()) {
+    expected = saltedHashValue(password, salt, mode);
+  } else if (inner == Inner::Type5) {
+    unsigned char digest[20];
+    unsigned int n = 0;
+    EVP_Digest(password.data(), password.size(), digest, &n, EVP_sha1(), nullptr);
+    expected = bytesToHex(std::string(reinterpret_cast<char*>(digest), sizeof digest), true);
+    OPENSSL_cleanse(digest, sizeof digest);
+  } else {
+    expected = password;
+  }
+  if (expected.empty() && !password.empty()) return false;  // unknown mode
+  return expected.size() == opened.content.size() &&
+         CRYPTO_memcmp(expected.data(), opened.content.data(), expected.size()) == 0;
+}
+
 }  // namespace tessel::server

@@ -27,7 +27,7 @@
 //   Opened out;
 //   if (!openOutput(47, outputFromDevice, keys, &out, &error)) { log(error); return; }
 //   // out.strength 'S', out.timestamp "20240101120000", out.content the salted-hash value:
-//   bool good = out.content == saltedHashValue(storedPassword, salt, 'S');
+//   bool good = matchesPassword(47, out, storedPassword, salt, 'S');
 //
 // Every function returns false with a one-line message in *error on corrupt, truncated or
 // foreign input; none throws or aborts. Messages never contain the opened plaintext.
@@ -162,6 +162,13 @@ struct Opened {
 // the direct types 3, 4, 22, 29, 30. Type 68 needs keys.pinKey to open its PIN.
 bool openOutput(int type, const std::string& output, const OpenKeys& keys, Opened* out,
                 std::string* error);
+
+// Whether an opened output of `type` was made from `password`. Hashed types (47, 48, 55, 59):
+// with a salt, the salted-hash value (mode 'S' or 'F'); with an empty salt (the app set none),
+// the password itself. Type 5: the SHA-1 of the password. Other types: the opened text itself.
+// False when the content was not opened.
+bool matchesPassword(int type, const Opened& opened, const std::string& password, const std::string& salt,
+                     char mode);
 
 // Wipes a std::string's bytes (plaintext held by the caller) before it is destroyed.
 void wipeString(std::string* s);

@@ -17,13 +17,15 @@ namespace {
 const char kUsage[] =
     "usage: tessel_open [--type N] --key APP.pem [--enc-key ENC.pem]\n"
     "                   [--pin-key HEX | --master-key HEX --wrapped-working-key HEX --wrapped-pin-key HEX]\n"
-    "                   [--password TEXT --salt TEXT [--mode S|F]] [--layout] OUTPUT|-\n"
+    "                   [--password TEXT [--salt TEXT] [--mode S|F]] [--layout] OUTPUT|-\n"
     "  --type N      encryption type the output was made with (default 48)\n"
     "  --key         application-platform private key (opens envelopes, types 56 and 73)\n"
     "  --enc-key     encryption-platform private key (opens RSA payloads, types 3 4 22 29 30)\n"
     "  --pin-key     type 68: the 16-byte PIN key as 32 hex digits, or derive it from the\n"
     "                master key and the two wrapped keys the app was given\n"
-    "  --password, --salt, --mode   hashed types 47 48 55 59: check the salted MD5 value\n"
+    "  --password    check the opened content against a stored password: the salted MD5 value\n"
+    "                for types 47 48 55 59 (with --salt and --mode; no --salt when the app set\n"
+    "                no hash random), SHA-1 for type 5, the text itself for the other types\n"
     "  --layout      only decode the envelope and print its field lengths\n"
     "  OUTPUT        the text returned by the library, or - to read it from stdin\n";
 
@@ -111,7 +113,7 @@ int openMain(int argc, char** argv) {
   if (!haveOutput) return failLine("no OUTPUT given (see --help)", 2);
   if (output == "-") output.assign(std::istreambuf_iterator<char>(std::cin), std::istreambuf_iterator<char>());
   output = trimmed(output);
-  if (havePassword != haveSalt) return failLine("--password and --salt go together", 2);
+  if (haveSalt && !havePassword) return failLine("--salt needs --password", 2);
 
   std::string error;
   if (layoutOnly) {
@@ -152,13 +154,10 @@ int openMain(int argc, char** argv) {
   if (opened.contentOpened) std::printf("content: %s\n", printable(opened.content).c_str());
   int status = 0;
   if (havePassword) {
-    const TypeLayout t = typeLayout(type);
-    if (t.inner != Inner::Hashed && t.inner != Inner::HashedRsa)
-      return failLine("--password applies to the hashed types 47, 48, 55 and 59 only", 2);
     if (!opened.contentOpened) return failLine("the payload is sealed: give --enc-key", 2);
-    const bool match = opened.content == saltedHashValue(password, salt, mode);
-    std::printf("hash: %s\n", match ? "match" : "mismatch");
-    if (!match) status = failLine("salted hash does not match", 3);
+    const bool match = matchesPassword(type, opened, password, salt, mode);
+    std::printf("password: %s\n", match ? "match" : "mismatch");
+    if (!match) status = failLine("the password does not match", 3);
   }
   wipeString(&opened.content);
   wipeString(&keys.pinKey);
