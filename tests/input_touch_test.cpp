@@ -1,0 +1,318 @@
+// Touch dispatch at its edges: margins, dead zones, key borders, actions, highlight flags,
+// modes, the length limit up to the buffer's capacity, and the accepts pattern.
+//
+// Most cases use a 100 x 40 surface (keys 10 x 10, margins 1) or 1000 x 400 (keys 100 x 100,
+// margins 10), where every border the dispatch compares against is exact in float and double.
+#include <gtest/gtest.h>
+
+#include <cmath>
+#include <string>
+
+#include "input/layout.h"
+#include "input/touch.h"
+#include "session/session.h"
+#include "session/settings.h"
+#include "support/keyboard_typist.h"
+
+namespace tessel {
+namespace {
+
+using test::KeyGrid;
+using test::KeyMap;
+using test::ScopedKeyboard;
+using test::Typist;
+
+constexpr int kDown = 0, kUp = 1, kMove = 2;
+
+int press(KeyboardSession& s, float x, float y) {
+  touch(s, kDown, x, y);
+  return touch(s, kUp, x, y);
+}
+
+bool allReleased(const KeyboardSession& s) {
+  for (auto& flag : s.keyReleased) {
+    if (flag != 1) return false;
+  }
+  return true;
+}
+
+struct EdgeCase {
+  const char* name;
+  float x, y;
+  int result;             // of the up
+  const char* appended;   // what the content holds afterwards
+};
+
+// 1000 x 400: margins at 10 and 990 / 390.
+const EdgeCase kMarginCases[] = {
+    {"leftEdgeInside", 10.0f, 50.0f, 0, "q"},
+    {"leftEdgeOutside", 9.99f, 50.0f, -1, ""},
+    {"rightEdgeInside", 990.0f, 50.0f, 0, "p"},
+    {"rightEdgeOutside", 990.01f, 50.0f, -1, ""},
+    {"topEdgeInside", 50.0f, 10.0f, 0, "q"},
+    {"topEdgeOutside", 50.0f, 9.99f, -1, ""},
+    {"bottomEdgeInside", 400.0f, 390.0f, 0, " "},
+    {"bottomEdgeOutside", 400.0f, 390.01f, -1, ""},
+    {"nanX", std::nanf(""), 50.0f, -1, ""},
+    {"negative", -50.0f, -50.0f, -1, ""},
+};
+
+TEST(TouchEdges, Margins) {
+  for (const auto& c : kMarginCases) {
+    SCOPED_TRACE(c.name);
+    ScopedKeyboard kb("margins", 1000, 400);
+    touch(kb.session(), kDown, 150, 50);  // light the character highlight first
+    ASSERT_EQ(kb.session().keyReleased[3], 0u);
+    EXPECT_EQ(touch(kb.session(), kUp, c.x, c.y), c.result);
+    EXPECT_EQ(kb.text(), c.appended);
+    if (c.result == -1) {
+      EXPECT_TRUE(allReleased(kb.session()));
+    }
+  }
+}
+
+// 100 x 40: keys 10 wide. Row 1 dead zones are x <= 3 and x >= 93; row 2 has shift below 15
+// and delete above 85; row 3 has switch below 25, space below 75, then done.
+const EdgeCase kBorderCases[] = {
+    {"row1LeftDeadZone", 3.0f, 15.0f, 0, ""},
+    {"row1FirstKey", std::nextafter(3.0f, 4.0f), 15.0f, 0, "a"},
+    {"row1RightDeadZone", 93.0f, 15.0f, 0, ""},
+    {"row1LastKey", std::nextafter(93.0f, 0.0f), 15.0f, 0, "l"},
+    {"row1KeyBorder", 13.0f, 15.0f, 0, "s"},
+    {"row0KeyBorder", 10.0f, 5.0f, 0, "w"},
+    {"row1TopBorder", 50.0f, 10.0f, 0, "g"},
+    {"shiftBelow15", std::nextafter(15.0f, 0.0f), 25.0f, 0, ""},
+    {"firstRow2KeyAt15", 15.0f, 25.0f, 0, "z"},
+    {"lastRow2Key", std::nextafter(85.0f, 0.0f), 25.0f, 0, "m"},
+    {"row2At85HoldsNoKey", 85.0f, 25.0f, 0, ""},
+    {"spaceAt25", 25.0f, 35.0f, 0, " "},
+    {"switchBelow25", std::nextafter(25.0f, 0.0f), 35.0f, 0, ""},
+    {"doneAt75", 75.0f, 35.0f, 1, ""},
+    {"spaceBelow75", std::nextafter(75.0f, 0.0f), 35.0f, 0, " "},
+};
+
+TEST(TouchEdges, KeyBorders) {
+  for (const auto& c : kBorderCases) {
+    SCOPED_TRACE(c.name);
+    ScopedKeyboard kb("borders", 100, 40);
+    setFinishMode(kb.session(), 1);
+    EXPECT_EQ(press(kb.session(), c.x, c.y), c.result);
+    EXPECT_EQ(kb.text(), c.appended);
+    EXPECT_EQ(kb.session().shiftOn, c.x < 15.0f && c.y > 20.0f && c.y < 30.0f ? 1u : 0u);
+    EXPECT_EQ(kb.session().symbolPage, c.x < 25.0f && c.y > 30.0f ? 1u : 0u);
+  }
+}
+
+TEST(TouchEdges, Row1DeadZoneReleasesTheCharacterHighlightOnly) {
+  ScopedKeyboard kb("deadzone", 100, 40);
+  KeyboardSession& s = kb.session();
+  touch(s, kDown, 50, 5);
+  touch(s, kDown, 5, 25);  // shift held
+  ASSERT_EQ(s.keyReleased[3], 0u);
+  EXPECT_EQ(touch(s, kDown, 2.0f, 15.0f), -1);
+  EXPECT_EQ(s.keyReleased[3], 1u);
+  EXPECT_EQ(s.keyReleased[4], 0u);
+  EXPECT_EQ(s.touchRow, 1u);
+}
+
+TEST(TouchActions, DownUpMoveAndUnknown) {
+  ScopedKeyboard kb("actions", 1000, 400);
+  KeyboardSession& s = kb.session();
+  EXPECT_EQ(touch(s, kDown, 150, 50), -1);
+  EXPECT_EQ(kb.length(), 0u);
+  EXPECT_EQ(s.keyReleased[3], 0u);
+  EXPECT_EQ(s.anyKeyReleased, 0u);
+  EXPECT_EQ(s.touchRow, 0u);
+  EXPECT_EQ(s.touchColumn, 1u);
+  touch(s, kDown, 50, 250);  // shift held
+  EXPECT_EQ(s.keyReleased[4], 0u);
+  EXPECT_EQ(touch(s, kMove, 250, 150), -1);  // onto 'd': every highlight dropped, then 'd' lit
+  EXPECT_EQ(s.keyReleased[4], 1u);
+  EXPECT_EQ(s.keyReleased[3], 0u);
+  EXPECT_EQ(s.touchColumn, 2u);
+  EXPECT_EQ(kb.length(), 0u);
+  EXPECT_EQ(touch(s, 3, 250, 150), -1);
+  EXPECT_EQ(touch(s, -1, 250, 150), -1);
+  EXPECT_EQ(touch(s, 255, 250, 150), -1);
+  EXPECT_EQ(kb.length(), 0u);
+  EXPECT_EQ(touch(s, kUp, 250, 150), 0);
+  EXPECT_EQ(kb.text(), "d");
+  EXPECT_EQ(s.keyReleased[3], 1u);
+  EXPECT_EQ(s.anyKeyReleased, 1u);
+}
+
+TEST(TouchActions, FunctionKeyHighlights) {
+  ScopedKeyboard kb("flags", 1000, 400);
+  KeyboardSession& s = kb.session();
+  setFinishMode(s, 1);
+  const struct {
+    float x, y;
+    int flag;
+    std::uint32_t column;
+  } keys[] = {{50, 250, 4, 0}, {950, 250, 5, 8}, {100, 350, 0, 0}, {500, 350, 1, 1}, {900, 350, 2, 2}};
+  for (const auto& k : keys) {
+    touch(s, kDown, k.x, k.y);
+    EXPECT_EQ(s.keyReleased[k.flag], 0u) << k.flag;
+    EXPECT_EQ(s.touchColumn, k.column);
+    EXPECT_EQ(s.anyKeyReleased, 0u);
+    touch(s, kUp, k.x, k.y);
+    EXPECT_EQ(s.keyReleased[k.flag], 1u) << k.flag;
+    EXPECT_EQ(s.anyKeyReleased, 1u);
+  }
+}
+
+TEST(TouchModes, SwitchKeyTogglesPageOrOpensTheDigitPad) {
+  ScopedKeyboard kb("switch", 1000, 400);
+  KeyboardSession& s = kb.session();
+  const KeyGrid grid(1000, 400);
+  Typist typist(s, grid, KeyMap::standard());
+  ASSERT_TRUE(typist.type("ab"));
+  EXPECT_EQ(typist.tap(grid.switchKey()), 0);
+  EXPECT_EQ(s.symbolPage, 1u);
+  EXPECT_EQ(typist.tap(grid.switchKey()), 0);
+  EXPECT_EQ(s.symbolPage, 0u);
+
+  setSwitchMode(s, 1);
+  EXPECT_EQ(typist.tap(grid.switchKey()), 0);
+  EXPECT_EQ(s.currentKbdType, 2u);
+  EXPECT_EQ(s.symbolPage, 0u);
+  EXPECT_EQ(typist.tap(grid.padCell(1, 3)), 0);  // back to the full keyboard, text kept
+  EXPECT_EQ(s.currentKbdType, 0u);
+  EXPECT_EQ(kb.text(), "ab");
+
+  setSwitchMode(s, 0);
+  setKbdType(s, 1);
+  EXPECT_EQ(typist.tap(grid.padCell(1, 3)), 0);  // clear
+  EXPECT_EQ(s.currentKbdType, 1u);
+  EXPECT_EQ(kb.length(), 0u);
+  EXPECT_EQ(kb.restingBuffer(), std::string(kContentBufferSize, '\0'));
+}
+
+TEST(TouchModes, NumberPadCells) {
+  for (std::int16_t type : {1, 2}) {
+    SCOPED_TRACE(type);
+    ScopedKeyboard kb("padcells", 1000, 400);
+    KeyboardSession& s = kb.session();
+    setFinishMode(s, 1);
+    setKbdType(s, type);
+    const KeyGrid grid(1000, 400);
+    Typist typist(s, grid, KeyMap::standard());
+    EXPECT_EQ(typist.tap(grid.padCell(0, 0)), 0);
+    EXPECT_EQ(typist.tap(grid.padCell(3, 1)), 0);  // "."
+    touch(s, kDown, grid.padCell(3, 2).x, grid.padCell(3, 2).y);
+    EXPECT_EQ(s.keyReleased[3], type == 2 ? 1u : 0u);
+    EXPECT_EQ(touch(s, kUp, grid.padCell(3, 2).x, grid.padCell(3, 2).y), type == 1 ? 1 : 0);
+    EXPECT_EQ(kb.text(), type == 1 ? "1." : "1");
+    for (int row : {2, 3}) {
+      touch(s, kDown, grid.padCell(row, 3).x, grid.padCell(row, 3).y);
+      EXPECT_EQ(s.keyReleased[2], 0u);
+      EXPECT_EQ(s.touchRow, 2u);
+      EXPECT_EQ(touch(s, kUp, grid.padCell(row, 3).x, grid.padCell(row, 3).y), 1);
+      EXPECT_EQ(s.keyReleased[2], 1u);
+    }
+    EXPECT_EQ(typist.tap(grid.padCell(0, 3)), 0);  // delete
+    EXPECT_EQ(kb.length(), type == 1 ? 1u : 0u);
+  }
+}
+
+TEST(TouchModes, DoneClearsLayoutBuiltOnlyWithFinishMode0) {
+  for (std::int16_t finish : {0, 1}) {
+    ScopedKeyboard kb("done", 1000, 400, true);
+    KeyboardSession& s = kb.session();
+    setFinishMode(s, finish);
+    const auto before = KeyMap::fromSession(s).letters;
+    EXPECT_EQ(touch(s, kDown, 900, 350), -1);
+    EXPECT_EQ(s.layoutBuilt, 1);
+    EXPECT_EQ(touch(s, kUp, 900, 350), 1);
+    EXPECT_EQ(s.layoutBuilt, finish == 0 ? 0 : 1);
+    buildLayout(s);  // the next surface creation
+    EXPECT_EQ(KeyMap::fromSession(s).letters == before, finish == 1);
+  }
+}
+
+TEST(TouchLimits, MaxLengthStopsCharactersAndSpaces) {
+  ScopedKeyboard kb("max6", 1000, 400, false, "[[:print:]]*", 6);
+  const KeyGrid grid(1000, 400);
+  Typist typist(kb.session(), grid, KeyMap::standard());
+  ASSERT_TRUE(typist.type("abc de"));
+  EXPECT_EQ(typist.tap(grid.characterKey(0, 0)), 0);
+  EXPECT_EQ(typist.tap(grid.spaceKey()), 0);
+  EXPECT_EQ(kb.text(), "abc de");
+  setKbdType(kb.session(), 1);
+  EXPECT_EQ(typist.tap(grid.padCell(3, 1)), 0);
+  EXPECT_EQ(typist.tap(grid.padCell(0, 0)), 0);
+  EXPECT_EQ(kb.text(), "abc de");
+}
+
+// A maxLength above the buffer is held to its 4092 characters: the buffer fills completely,
+// keeps its terminator, and the next key is dropped.
+TEST(TouchLimits, FillingTheWholeBuffer) {
+  ScopedKeyboard kb("fill", 1000, 400, false, "[[:print:]]*", 32767);
+  KeyboardSession& s = kb.session();
+  EXPECT_EQ(s.maxLength, 4092);
+  for (std::size_t i = 0; i < kContentCapacity; ++i) ASSERT_EQ(press(s, 150, 50), 0);
+  EXPECT_EQ(kb.length(), kContentCapacity);
+  EXPECT_EQ(press(s, 150, 50), 0);
+  EXPECT_EQ(press(s, 500, 350), 0);
+  EXPECT_EQ(kb.length(), kContentCapacity);
+  EXPECT_EQ(kb.text(), std::string(kContentCapacity, 'w'));
+  EXPECT_EQ(s.content->plaintext[kContentCapacity], 0);
+  // Even with the limit bypassed, the store refuses to write past its capacity.
+  s.maxLength = 32767;
+  EXPECT_EQ(press(s, 150, 50), 0);
+  appendCharacter(*s.content, 'x', "[[:print:]]*");
+  EXPECT_EQ(kb.length(), kContentCapacity);
+  EXPECT_EQ(s.content->plaintext[kContentCapacity], 0);
+}
+
+TEST(TouchPattern, RejectedCharacterLeavesTheSealedBytesUnchanged) {
+  ScopedKeyboard kb("accepts", 1000, 400, false, "[0-9]{0,3}");
+  const KeyGrid grid(1000, 400);
+  Typist typist(kb.session(), grid, KeyMap::standard());
+  ASSERT_TRUE(typist.type("12"));
+  const std::string sealed = kb.restingBuffer();
+  ASSERT_TRUE(typist.type("a# "));  // letters, a symbol and space: each refused
+  EXPECT_EQ(kb.restingBuffer(), sealed);
+  ASSERT_TRUE(typist.type("34"));   // the fourth digit breaks {0,3}
+  EXPECT_EQ(kb.text(), "123");
+}
+
+TEST(TouchPattern, NoPatternDropsEveryCharacterButEditingStillWorks) {
+  ScopedKeyboard kb("nopattern", 1000, 400);
+  KeyboardSession& s = kb.session();
+  const KeyGrid grid(1000, 400);
+  Typist typist(s, grid, KeyMap::standard());
+  ASSERT_TRUE(typist.type("abc"));
+  setAccepts(s, nullptr);
+  const std::string sealed = kb.restingBuffer();
+  ASSERT_TRUE(typist.type("d e1"));
+  setKbdType(s, 1);
+  EXPECT_EQ(typist.tap(grid.padCell(3, 1)), 0);
+  EXPECT_EQ(typist.tap(grid.padCell(0, 0)), 0);
+  EXPECT_EQ(kb.restingBuffer(), sealed);
+  EXPECT_EQ(typist.tap(grid.padCell(0, 3)), 0);  // delete
+  EXPECT_EQ(kb.text(), "ab");
+  EXPECT_EQ(typist.tap(grid.padCell(1, 3)), 0);  // clear
+  EXPECT_EQ(kb.length(), 0u);
+  EXPECT_EQ(typist.tap(grid.padCell(0, 3)), 0);  // delete on empty content
+  EXPECT_EQ(kb.length(), 0u);
+}
+
+// A session touched before any layout or geometry: zeroed tables and key sizes. Nothing may
+// trap and no touch is taken as a key.
+TEST(TouchBadInput, UnbuiltSession) {
+  const int handle = createSession("unbuilt");
+  KeyboardSession& s = *sessionAt(handle);
+  setAccepts(s, "[[:print:]]*");
+  setMaxLength(s, 10);
+  for (float x : {0.0f, 1.0f, 50.0f}) {
+    for (int action : {kDown, kUp, kMove}) EXPECT_EQ(touch(s, action, x, x), x == 0.0f && action == kUp ? 0 : -1);
+  }
+  applySurfaceGeometry(s, 100, 40, 0);  // columnCount still 0: key width infinite
+  EXPECT_EQ(touch(s, kUp, 50, 20), -1);
+  EXPECT_EQ(contentLength(s), 0);
+  destroySession(handle);
+}
+
+}  // namespace
+}  // namespace tessel
