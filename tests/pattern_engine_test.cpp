@@ -130,6 +130,10 @@ TEST(PatternMatch, ResultLayout) {
   EXPECT_EQ(spans("(a|)*", "aa"), (MatchResult{1, 1, 0, 2, 2, 2}));
   EXPECT_EQ(spans("((a)|b)*", "ab"), (MatchResult{1, 2, 0, 2, 1, 2, 0, 1}));
   EXPECT_EQ(spans("(x*?)(x*)", "xxx"), (MatchResult{1, 2, 0, 3, 0, 0, 0, 3}));
+  // A reluctant loop resumes from where its own last way ended, not from where later
+  // nodes left the position.
+  EXPECT_EQ(spans("(a+)*?.", "aa"), (MatchResult{1, 1, 0, 2, 0, 1}));
+  EXPECT_EQ(spans("(a|aa)*?.", "aa"), (MatchResult{1, 1, 0, 2, 0, 1}));
   // A group inside a zero-count repetition exists but never takes part.
   EXPECT_EQ(spans("(a){0}b", "b"), (MatchResult{1, 1, 0, 1, -1, -1}));
 }

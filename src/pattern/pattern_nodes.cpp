@@ -5,7 +5,8 @@
 //   group              oldStart oldEnd [child state]
 //   greedy/fixed       per iteration: [child state] iterStart countBefore; then count
 //                      one-byte child: lowestEnd currentEnd (nothing when tail)
-//   reluctant          as greedy; one-byte child: limit current (nothing when tail)
+//   reluctant          per iteration as greedy; then endPosition count
+//                      one-byte child: limit current (nothing when tail)
 //   possessive         saved captures of its groups (nothing for a one-byte child)
 // "countBefore" lets a mandatory iteration that consumed nothing stand for all remaining
 // mandatory ones (count jumps to the minimum) and still be undone exactly.
@@ -457,6 +458,7 @@ bool ReluctantRepeatNode::matchNext(MatchContext& c) const {
     return true;
   }
   const std::int32_t count = c.pop();
+  c.pos = c.pop();  // where the last way ended: later nodes have moved on since
   return run(c, count, Phase::kOneMore);
 }
 
@@ -481,6 +483,7 @@ bool ReluctantRepeatNode::run(MatchContext& c, std::int32_t count, Phase phase) 
           count = (c.pos == s) ? min_ : count + 1;
         }
         if (!failed) {
+          c.push(c.pos);
           c.push(count);
           return true;
         }
@@ -503,6 +506,7 @@ bool ReluctantRepeatNode::run(MatchContext& c, std::int32_t count, Phase phase) 
             if (found) {
               c.push(s);
               c.push(count);
+              c.push(c.pos);
               c.push(count + 1);
               return true;
             }
