@@ -185,17 +185,19 @@ TEST(BigNumberArithmetic, DivideMatchesOpenSsl) {
   }
 }
 
-TEST(BigNumberArithmetic, DivideAddBackCase) {
-  // Knuth's example family where the two-limb quotient estimate is still one too large.
-  const std::string a = "7FFF800000000000" "0000000000000000", b = "800000000000" "0000000000000001";
-  BigNumber q, r;
-  ASSERT_TRUE(bnDivide(fromHex(a), fromHex(b), q, r));
-  EXPECT_EQ(toHex(q), opensslBnDiv(a, b).first);
-  EXPECT_EQ(toHex(r), opensslBnDiv(a, b).second);
-  const std::string c = "800000000000000000000003", d = "200000000000000000000001";
-  ASSERT_TRUE(bnDivide(fromHex(c), fromHex(d), q, r));
-  EXPECT_EQ(toHex(q), opensslBnDiv(c, d).first);
-  EXPECT_EQ(toHex(r), opensslBnDiv(c, d).second);
+TEST(BigNumberArithmetic, DivideAddBackCases) {
+  // Operands for which the two-limb quotient estimate is still one too large, so the long
+  // division must add the divisor back (found by instrumenting that step).
+  const std::pair<std::string, std::string> cases[] = {
+      {"7FFFFFFF800000000000000000000000", "800000000000000000000001"},
+      {"8000000000000000000000000000000000000003", "20000000000000000000000000000001"}};
+  for (const auto& c : cases) {
+    BigNumber q, r;
+    ASSERT_TRUE(bnDivide(fromHex(c.first), fromHex(c.second), q, r));
+    const auto expected = opensslBnDiv(c.first, c.second);
+    EXPECT_EQ(toHex(q), expected.first) << c.first << " / " << c.second;
+    EXPECT_EQ(toHex(r), expected.second) << c.first << " % " << c.second;
+  }
 }
 
 TEST(BigNumberArithmetic, DivideEdgesAndAliasing) {
@@ -210,7 +212,7 @@ TEST(BigNumberArithmetic, DivideEdgesAndAliasing) {
   EXPECT_EQ(toHex(r), "3");
 }
 
-TEST(BigNumberModExp, MatchesOpenSslOnBothWidthsAndEvenModuli) {
+TEST(BigNumberModExp, MatchesOpenSslOnEveryKernelAndEvenModuli) {
   Values v(4);
   for (int i = 0; i < 200; ++i) {
     std::string mod = v.hex(v.limbs(1, 70));
@@ -220,11 +222,15 @@ TEST(BigNumberModExp, MatchesOpenSslOnBothWidthsAndEvenModuli) {
     if (Values::trim(mod) == "0") continue;
     const std::string base = v.hex(v.limbs(1, 70)), exp = v.hex(v.limbs(1, 2));
     const std::string expected = opensslBnModExp(base, exp, mod);
-    BigNumber r1, r2;
+    BigNumber r1, r2, r3;
     ASSERT_TRUE(bnModExp(fromHex(base), fromHex(exp), fromHex(mod), r1));
-    ASSERT_TRUE(bnModExpPortable(fromHex(base), fromHex(exp), fromHex(mod), r2));
+    bnAllowAssemblyKernel(false);  // the C rows, where the assembly kernel would be used
+    ASSERT_TRUE(bnModExp(fromHex(base), fromHex(exp), fromHex(mod), r2));
+    bnAllowAssemblyKernel(true);
+    ASSERT_TRUE(bnModExpPortable(fromHex(base), fromHex(exp), fromHex(mod), r3));
     ASSERT_EQ(toHex(r1), expected) << base << " ^ " << exp << " mod " << mod;
     ASSERT_EQ(toHex(r2), expected) << base << " ^ " << exp << " mod " << mod;
+    ASSERT_EQ(toHex(r3), expected) << base << " ^ " << exp << " mod " << mod;
   }
 }
 

@@ -9,6 +9,7 @@
 // bnModExpPortable so tests cover it on every host).
 #include "crypto/bignum.h"
 
+#include <atomic>
 #include <cstring>
 
 #include "crypto/wipe.h"
@@ -36,70 +37,90 @@ struct ScopedWipe {
   ~ScopedWipe() { wipeObject(object); }
 };
 
-// q[0..m-n] and r[0..n-1] from u[0..m-1] / v[0..n-1]; m >= n >= 1, v[n-1] != 0. q may be null.
-void divideRaw(const u32* u, int m, const u32* v, int n, u32* q, u32* r) noexcept {
+template <typename L>
+int countLeadingZeros(L x) noexcept {
+  if (sizeof(L) == 8) return x == 0 ? 64 : __builtin_clzll(static_cast<unsigned long long>(x));
+  return countLeadingZeros32(static_cast<u32>(x));
+}
+
+// q[0..m-n] and r[0..n-1] from u[0..m-1] / v[0..n-1] on limbs of type L (W twice as wide);
+// m >= n >= 1, v[n-1] != 0, m < kWide. q may be null.
+template <typename L, typename W>
+void divideLimbs(const L* u, int m, const L* v, int n, L* q, L* r) noexcept {
+  constexpr int bits = static_cast<int>(8 * sizeof(L));
   if (n == 1) {
-    u64 rest = 0;
+    W rest = 0;
     for (int j = m - 1; j >= 0; --j) {
-      const u64 cur = (rest << 32) | u[j];
-      if (q) q[j] = static_cast<u32>(cur / v[0]);
+      const W cur = (rest << bits) | u[j];
+      if (q) q[j] = static_cast<L>(cur / v[0]);
       rest = cur % v[0];
     }
-    r[0] = static_cast<u32>(rest);
+    r[0] = static_cast<L>(rest);
     return;
   }
-  u32 un[kWide + 1];
-  u32 vn[kWide];
+  L un[kWide + 1];
+  L vn[kWide];
   ScopedWipe<decltype(un)> wipeU{un};
   ScopedWipe<decltype(vn)> wipeV{vn};
   // D1: normalise so the divisor's top bit is set, which bounds the quotient estimate's error.
-  const int s = countLeadingZeros32(v[n - 1]);
+  const int s = countLeadingZeros(v[n - 1]);
   for (int i = n - 1; i > 0; --i)
-    vn[i] = s ? (v[i] << s) | (v[i - 1] >> (32 - s)) : v[i];
-  vn[0] = v[0] << s;
-  un[m] = s ? u[m - 1] >> (32 - s) : 0;
+    vn[i] = s ? static_cast<L>((v[i] << s) | (v[i - 1] >> (bits - s))) : v[i];
+  vn[0] = static_cast<L>(v[0] << s);
+  un[m] = s ? static_cast<L>(u[m - 1] >> (bits - s)) : 0;
   for (int i = m - 1; i > 0; --i)
-    un[i] = s ? (u[i] << s) | (u[i - 1] >> (32 - s)) : u[i];
-  un[0] = u[0] << s;
+    un[i] = s ? static_cast<L>((u[i] << s) | (u[i - 1] >> (bits - s))) : u[i];
+  un[0] = static_cast<L>(u[0] << s);
 
   for (int j = m - n; j >= 0; --j) {
     // D3: estimate the quotient digit from the top two limbs, correct it at most twice.
-    const u64 top = (static_cast<u64>(un[j + n]) << 32) | un[j + n - 1];
-    u64 qhat = top / vn[n - 1];
-    u64 rhat = top % vn[n - 1];
-    while (qhat >> 32 || qhat * vn[n - 2] > ((rhat << 32) | un[j + n - 2])) {
+    const W top = (static_cast<W>(un[j + n]) << bits) | un[j + n - 1];
+    W qhat = top / vn[n - 1];
+    W rhat = top % vn[n - 1];
+    while ((qhat >> bits) != 0 ||
+           qhat * vn[n - 2] > ((rhat << bits) | un[j + n - 2])) {
       --qhat;
       rhat += vn[n - 1];
-      if (rhat >> 32) break;
+      if ((rhat >> bits) != 0) break;
     }
-    // D4: multiply and subtract.
-    std::int64_t t = 0;
-    u64 borrow = 0;
+    // D4: multiply and subtract qhat * vn from the window un[j..j+n].
+    const L digit = static_cast<L>(qhat);
+    L carry = 0, borrow = 0;
     for (int i = 0; i < n; ++i) {
-      const u64 p = qhat * vn[i];
-      t = static_cast<std::int64_t>(un[i + j]) - static_cast<std::int64_t>(borrow) -
-          static_cast<std::int64_t>(p & 0xFFFFFFFFu);
-      un[i + j] = static_cast<u32>(t);
-      borrow = (p >> 32) - static_cast<u64>(t >> 32);
+      const W p = static_cast<W>(digit) * vn[i] + carry;
+      carry = static_cast<L>(p >> bits);
+      const L lo = static_cast<L>(p);
+      const L x = un[i + j];
+      const L d = static_cast<L>(x - lo);
+      const L b1 = static_cast<L>(x < lo);
+      un[i + j] = static_cast<L>(d - borrow);
+      borrow = static_cast<L>(b1 | static_cast<L>(d < borrow));
     }
-    t = static_cast<std::int64_t>(un[j + n]) - static_cast<std::int64_t>(borrow);
-    un[j + n] = static_cast<u32>(t);
+    const L x = un[j + n];
+    const L d = static_cast<L>(x - carry);
+    const bool negative = x < carry || d < borrow;
+    un[j + n] = static_cast<L>(d - borrow);
+    L quotientDigit = digit;
     // D5/D6: the estimate was one too large (rare): add the divisor back.
-    if (t < 0) {
-      --qhat;
-      u64 carry = 0;
+    if (negative) {
+      --quotientDigit;
+      L c = 0;
       for (int i = 0; i < n; ++i) {
-        const u64 sum = static_cast<u64>(un[i + j]) + vn[i] + carry;
-        un[i + j] = static_cast<u32>(sum);
-        carry = sum >> 32;
+        const W sum = static_cast<W>(un[i + j]) + vn[i] + c;
+        un[i + j] = static_cast<L>(sum);
+        c = static_cast<L>(sum >> bits);
       }
-      un[j + n] = static_cast<u32>(un[j + n] + carry);
+      un[j + n] = static_cast<L>(un[j + n] + c);
     }
-    if (q) q[j] = static_cast<u32>(qhat);
+    if (q) q[j] = quotientDigit;
   }
   // D8: unnormalise the remainder.
   for (int i = 0; i < n; ++i)
-    r[i] = s ? (un[i] >> s) | (un[i + 1] << (32 - s)) : un[i];
+    r[i] = s ? static_cast<L>((un[i] >> s) | (un[i + 1] << (bits - s))) : un[i];
+}
+
+void divideRaw(const u32* u, int m, const u32* v, int n, u32* q, u32* r) noexcept {
+  divideLimbs<u32, u64>(u, m, v, n, q, r);
 }
 
 // p[0..an+bn-1] = a * b.
@@ -136,12 +157,128 @@ constexpr int maxLimbs() {
   return kBigNumberLimbs * 32 / limbBits<L>();
 }
 
+#if defined(__clang__)
+#define TESSEL_UNROLL4 _Pragma("clang loop unroll_count(4)")
+#elif defined(__GNUC__)
+#define TESSEL_UNROLL4 _Pragma("GCC unroll 4")
+#else
+#define TESSEL_UNROLL4
+#endif
+
+// t[0..n) += a[0..n) * b; returns the carry limb. The one kernel under every product: a single
+// carry chain, which compilers keep in registers.
+template <typename L, typename W>
+inline L mulAddRow(L* t, const L* a, int n, L b) noexcept {
+  constexpr int bits = limbBits<L>();
+  L carry = 0;
+  TESSEL_UNROLL4
+  for (int j = 0; j < n; ++j) {
+    const W p = static_cast<W>(a[j]) * b + t[j] + carry;
+    t[j] = static_cast<L>(p);
+    carry = static_cast<L>(p >> bits);
+  }
+  return carry;
+}
+
+#if defined(__x86_64__) && (defined(__GNUC__) || defined(__clang__))
+#define TESSEL_HAVE_ADX_KERNEL 1
+
+// The same row on x86-64 with BMI2/ADX: mulx leaves the flags alone, and adcx/adox run two
+// independent carry chains (CF adds t[j], OF adds the previous high word), so the additions of
+// neighbouring limbs overlap. Four limbs per block, then single limbs; loop control uses only
+// lea, mov and jrcxz, which keep both flags intact. Chosen at run time from CPUID.
+inline std::uint64_t mulAddRowAdx(std::uint64_t* t, const std::uint64_t* a, int n,
+                                  std::uint64_t b) noexcept {
+  std::uint64_t hi = 0;
+  const long blocks = n >> 2, rest = n & 3;
+  __asm__ volatile(
+      "xor %%r10d, %%r10d\n\t"  // CF = OF = 0
+      "mov %[blocks], %%rcx\n"
+      "1:\n\t"
+      "jrcxz 2f\n\t"
+      "mulx (%[a]), %%r10, %%r11\n\t"
+      "adcx (%[t]), %%r10\n\t"
+      "adox %[hi], %%r10\n\t"
+      "mov %%r10, (%[t])\n\t"
+      "mulx 8(%[a]), %%r10, %[hi]\n\t"
+      "adcx 8(%[t]), %%r10\n\t"
+      "adox %%r11, %%r10\n\t"
+      "mov %%r10, 8(%[t])\n\t"
+      "mulx 16(%[a]), %%r10, %%r11\n\t"
+      "adcx 16(%[t]), %%r10\n\t"
+      "adox %[hi], %%r10\n\t"
+      "mov %%r10, 16(%[t])\n\t"
+      "mulx 24(%[a]), %%r10, %[hi]\n\t"
+      "adcx 24(%[t]), %%r10\n\t"
+      "adox %%r11, %%r10\n\t"
+      "mov %%r10, 24(%[t])\n\t"
+      "lea 32(%[a]), %[a]\n\t"
+      "lea 32(%[t]), %[t]\n\t"
+      "lea -1(%%rcx), %%rcx\n\t"
+      "jmp 1b\n"
+      "2:\n\t"
+      "mov %[rest], %%rcx\n"
+      "3:\n\t"
+      "jrcxz 4f\n\t"
+      "mulx (%[a]), %%r10, %%r11\n\t"
+      "adcx (%[t]), %%r10\n\t"
+      "adox %[hi], %%r10\n\t"
+      "mov %%r10, (%[t])\n\t"
+      "mov %%r11, %[hi]\n\t"
+      "lea 8(%[a]), %[a]\n\t"
+      "lea 8(%[t]), %[t]\n\t"
+      "lea -1(%%rcx), %%rcx\n\t"
+      "jmp 3b\n"
+      "4:\n\t"
+      "mov $0, %%r10d\n\t"  // mov keeps the flags: fold both pending carries into hi
+      "adcx %%r10, %[hi]\n\t"
+      "adox %%r10, %[hi]\n\t"
+      : [t] "+r"(t), [a] "+r"(a), [hi] "+r"(hi)
+      : "d"(b), [blocks] "r"(blocks), [rest] "r"(rest)
+      : "rcx", "r10", "r11", "cc", "memory");
+  return hi;
+}
+
+bool cpuHasAdx() noexcept {
+  unsigned eax = 0, ebx = 0, ecx = 0, edx = 0;
+  __asm__("cpuid" : "=a"(eax), "=b"(ebx), "=c"(ecx), "=d"(edx) : "a"(0), "c"(0));
+  if (eax < 7) return false;
+  __asm__("cpuid" : "=a"(eax), "=b"(ebx), "=c"(ecx), "=d"(edx) : "a"(7), "c"(0));
+  return (ebx & (1u << 8)) != 0 && (ebx & (1u << 19)) != 0;  // BMI2 and ADX
+}
+
+std::atomic<bool> g_adxAllowed{true};
+
+bool useAdx() noexcept {
+  static const bool available = cpuHasAdx();
+  return available && g_adxAllowed.load(std::memory_order_relaxed);
+}
+#endif
+
+// The row kernel a Montgomery context uses, picked once per context.
+template <typename L, typename W>
+struct RowKernel {
+  using Fn = L (*)(L*, const L*, int, L) noexcept;
+  static Fn pick() noexcept { return &mulAddRow<L, W>; }
+};
+
+#if defined(TESSEL_HAVE_ADX_KERNEL) && defined(__SIZEOF_INT128__)
+template <>
+struct RowKernel<std::uint64_t, unsigned __int128> {
+  using Fn = std::uint64_t (*)(std::uint64_t*, const std::uint64_t*, int, std::uint64_t) noexcept;
+  static Fn pick() noexcept {
+    return useAdx() ? &mulAddRowAdx : &mulAddRow<std::uint64_t, unsigned __int128>;
+  }
+};
+#endif
+
 template <typename L, typename W>
 struct Montgomery {
   int n = 0;                   // limbs of the modulus
   L mod[maxLimbs<L>()] = {};
   L r2[maxLimbs<L>()] = {};    // R^2 mod n, R = 2^(bits(L) * n)
   L n0 = 0;                    // -mod^-1 mod 2^bits(L)
+  typename RowKernel<L, W>::Fn row = RowKernel<L, W>::pick();
 
   // The value as limbs of type L (n of them; the value has fewer significant limbs).
   static void load(const BigNumber& v, L* out, int n) noexcept {
@@ -177,56 +314,83 @@ struct Montgomery {
     L inv = mod[0];
     for (int i = 0; i < 5; ++i) inv = static_cast<L>(inv * static_cast<L>(2 - mod[0] * inv));
     n0 = static_cast<L>(0 - inv);
-    // R^2 mod n by one long division of 2^(2 * bits(L) * n).
-    u32 power[kWide] = {};
-    const int powerLimbs = 2 * n * per + 1;
-    power[powerLimbs - 1] = 1;
-    u32 rest[kBigNumberLimbs] = {};
-    divideRaw(power, powerLimbs, modulus.limbs, static_cast<int>(modulus.count), nullptr, rest);
-    BigNumber r2Value;
-    setFromRaw(r2Value, rest, static_cast<int>(modulus.count));
-    load(r2Value, r2, n);
+    // R^2 mod n by one long division of 2^(2 * bits(L) * n), on limbs of type L.
+    L power[2 * maxLimbs<L>() + 1] = {};
+    power[2 * n] = 1;
+    divideLimbs<L, W>(power, 2 * n + 1, mod, n, nullptr, r2);
   }
 
   // out = a * b / R mod n, fully reduced; a, b < n. out may alias a or b.
-  // Coarsely integrated operand scanning: one pass per limb of b multiplies and reduces at once.
   void multiply(const L* a, const L* b, L* out) const noexcept {
-    constexpr int shift = limbBits<L>();
-    L t[maxLimbs<L>() + 1] = {};
-    for (int i = 0; i < n; ++i) {
-      const L bi = b[i];
-      W p = static_cast<W>(a[0]) * bi + t[0];
-      L c1 = static_cast<L>(p >> shift);
-      const L s0 = static_cast<L>(p);
-      const L m = static_cast<L>(s0 * n0);
-      W q = static_cast<W>(m) * mod[0] + s0;
-      L c2 = static_cast<L>(q >> shift);
-      for (int j = 1; j < n; ++j) {
-        p = static_cast<W>(a[j]) * bi + t[j] + c1;
-        c1 = static_cast<L>(p >> shift);
-        q = static_cast<W>(m) * mod[j] + static_cast<L>(p) + c2;
-        t[j - 1] = static_cast<L>(q);
-        c2 = static_cast<L>(q >> shift);
-      }
-      const W top = static_cast<W>(t[n]) + c1 + c2;
-      t[n - 1] = static_cast<L>(top);
-      t[n] = static_cast<L>(top >> shift);
+    L t[2 * maxLimbs<L>()];
+    for (int i = 0; i < n; ++i) t[i] = 0;
+    for (int i = 0; i < n; ++i) t[i + n] = row(t + i, a, n, b[i]);
+    reduce(t, out);
+  }
+
+  // out = a * a / R mod n; a < n. Each cross product a[i] * a[j] is formed once and doubled,
+  // which saves nearly half of the multiplications of a general product.
+  void square(const L* a, L* out) const noexcept {
+    constexpr int bits = limbBits<L>();
+    L t[2 * maxLimbs<L>()];
+    for (int i = 0; i < 2 * n; ++i) t[i] = 0;
+    for (int i = 0; i + 1 < n; ++i) t[i + n] = row(t + 2 * i + 1, a + i + 1, n - i - 1, a[i]);
+    L shifted = 0;
+    for (int i = 0; i < 2 * n; ++i) {
+      const L v = t[i];
+      t[i] = static_cast<L>((v << 1) | shifted);
+      shifted = static_cast<L>(v >> (bits - 1));
     }
-    // t < 2n: subtract n once unless that borrows, chosen by mask rather than by branch.
+    L carry = 0;
+    for (int i = 0; i < n; ++i) {
+      const W sq = static_cast<W>(a[i]) * a[i];
+      const W lo = static_cast<W>(t[2 * i]) + static_cast<L>(sq) + carry;
+      t[2 * i] = static_cast<L>(lo);
+      const W hi = static_cast<W>(t[2 * i + 1]) + static_cast<L>(sq >> bits) + static_cast<L>(lo >> bits);
+      t[2 * i + 1] = static_cast<L>(hi);
+      carry = static_cast<L>(hi >> bits);
+    }
+    reduce(t, out);
+  }
+
+  // out = a / R mod n: leaves the Montgomery domain with one reduction and no product.
+  void leaveDomain(const L* a, L* out) const noexcept {
+    L t[2 * maxLimbs<L>()];
+    for (int i = 0; i < n; ++i) t[i] = a[i];
+    for (int i = n; i < 2 * n; ++i) t[i] = 0;
+    reduce(t, out);
+  }
+
+ private:
+  // Montgomery reduction of the 2n-limb t (< n * R) to t / R mod n in out; wipes t.
+  // Separate operand scanning: each row adds m * mod so that one more low limb becomes zero.
+  void reduce(L* t, L* out) const noexcept {
+    constexpr int bits = limbBits<L>();
+    L top = 0;  // the carry above limb 2n - 1 (0 or 1)
+    for (int i = 0; i < n; ++i) {
+      const L m = static_cast<L>(t[i] * n0);
+      const L c = row(t + i, mod, n, m);
+      const W s = static_cast<W>(t[i + n]) + c + top;
+      t[i + n] = static_cast<L>(s);
+      top = static_cast<L>(s >> bits);
+    }
+    // The result (top, t[n..2n)) is below 2n: subtract n once unless that borrows, chosen by
+    // mask rather than by branch.
+    const L* r = t + n;
     L diff[maxLimbs<L>()];
     L borrow = 0;
     for (int j = 0; j < n; ++j) {
-      const L x = t[j];
+      const L x = r[j];
       const L d = static_cast<L>(x - mod[j]);
       const L b1 = static_cast<L>(x < mod[j]);
       diff[j] = static_cast<L>(d - borrow);
       borrow = static_cast<L>(b1 | static_cast<L>(d < borrow));
     }
-    // Keep t when t < n, i.e. the subtraction borrowed out of the top limb too.
-    const L keep = static_cast<L>(0 - static_cast<L>(borrow > t[n]));
-    for (int j = 0; j < n; ++j) out[j] = static_cast<L>((t[j] & keep) | (diff[j] & ~keep));
-    secureWipe(t, sizeof(t));
-    secureWipe(diff, sizeof(diff));
+    // Keep r when r < n, i.e. the subtraction borrowed out of the top limb too.
+    const L keep = static_cast<L>(0 - static_cast<L>(borrow > top));
+    for (int j = 0; j < n; ++j) out[j] = static_cast<L>((r[j] & keep) | (diff[j] & ~keep));
+    secureWipe(t, sizeof(L) * 2 * static_cast<std::size_t>(n));
+    secureWipe(diff, sizeof(L) * static_cast<std::size_t>(n));
   }
 };
 
@@ -241,12 +405,10 @@ void modExpMontgomery(const BigNumber& x, const BigNumber& e, const BigNumber& m
   ctx.multiply(acc, ctx.r2, xm);  // x * R mod n
   std::memcpy(acc, xm, sizeof(L) * static_cast<std::size_t>(ctx.n));
   for (int bit = static_cast<int>(bnBitLength(e)) - 2; bit >= 0; --bit) {
-    ctx.multiply(acc, acc, acc);
+    ctx.square(acc, acc);
     if ((e.limbs[bit / 32] >> (bit % 32)) & 1u) ctx.multiply(acc, xm, acc);
   }
-  L one[maxLimbs<L>()] = {};
-  one[0] = 1;
-  ctx.multiply(acc, one, acc);  // leave the Montgomery domain
+  ctx.leaveDomain(acc, acc);
   Montgomery<L, W>::store(acc, ctx.n, result);
   wipeObject(xm);
   wipeObject(acc);
@@ -309,12 +471,20 @@ bool modExp(const BigNumber& base, const BigNumber& exponent, const BigNumber& m
   return true;
 }
 
-int digitValue(char c) noexcept {
-  if (c >= '0' && c <= '9') return c - '0';
-  if (c >= 'A' && c <= 'F') return c - 'A' + 10;
-  if (c >= 'a' && c <= 'f') return c - 'a' + 10;
-  return -1;
-}
+// Value of each character as a digit, -1 for anything that is not one.
+struct DigitTable {
+  signed char v[256];
+  constexpr DigitTable() : v() {
+    for (int c = 0; c < 256; ++c) v[c] = -1;
+    for (int c = '0'; c <= '9'; ++c) v[c] = static_cast<signed char>(c - '0');
+    for (int c = 'A'; c <= 'F'; ++c) v[c] = static_cast<signed char>(c - 'A' + 10);
+    for (int c = 'a'; c <= 'f'; ++c) v[c] = static_cast<signed char>(c - 'a' + 10);
+  }
+  constexpr int operator[](unsigned char c) const { return v[c]; }
+};
+constexpr DigitTable kDigitValue;
+
+int digitValue(char c) noexcept { return kDigitValue[static_cast<unsigned char>(c)]; }
 
 // quotient = a / word, returns the remainder; word != 0.
 u32 divideByWord(BigNumber& a, u32 word) noexcept {
@@ -347,21 +517,32 @@ BigNumber bnFromU64(std::uint64_t value) noexcept {
 bool bnRead(const char* text, unsigned radix, BigNumber& out) noexcept {
   out = bnZero();
   if (text == nullptr || *text == '\0' || radix < 2 || radix > 16) return false;
-  for (const char* p = text; *p; ++p) {
-    const int v = digitValue(*p);
-    if (v < 0 || static_cast<unsigned>(v) >= radix) return false;
-  }
   while (*text == '0' && text[1] != '\0') ++text;
-  const std::size_t digits = std::strlen(text);
   if (radix == 16) {
-    // Nibbles straight into place: no arithmetic, linear in the length.
+    // One pass from the last digit: eight digits to a limb, checked as they are placed.
+    const std::size_t digits = std::strlen(text);
     if (digits > kBigNumberBits / 4) return false;
-    for (std::size_t k = 0; k < digits; ++k) {
-      const std::size_t nibble = digits - 1 - k;
-      out.limbs[nibble / 8] |= static_cast<u32>(digitValue(text[k])) << (4 * (nibble % 8));
+    std::size_t left = digits;
+    for (int limb = 0; left > 0; ++limb) {
+      const std::size_t take = left < 8 ? left : 8;
+      u32 v = 0;
+      for (const char* p = text + left - take; p < text + left; ++p) {
+        const int d = kDigitValue[static_cast<unsigned char>(*p)];
+        if (d < 0) {
+          wipeObject(out);
+          return false;
+        }
+        v = (v << 4) | static_cast<u32>(d);
+      }
+      out.limbs[limb] = v;
+      left -= take;
     }
     out.count = static_cast<u32>(trimmed(out.limbs, kBigNumberLimbs));
     return true;
+  }
+  for (const char* p = text; *p; ++p) {
+    const int v = kDigitValue[static_cast<unsigned char>(*p)];
+    if (v < 0 || static_cast<unsigned>(v) >= radix) return false;
   }
   for (const char* p = text; *p; ++p) {
     // out = out * radix + digit; a carry out of the top limb means the value is too wide.
@@ -485,6 +666,14 @@ bool bnDivide(const BigNumber& a, const BigNumber& b, BigNumber& quotient,
 bool bnModExp(const BigNumber& base, const BigNumber& exponent, const BigNumber& modulus,
               BigNumber& result) noexcept {
   return modExp(base, exponent, modulus, result, Width::kDefault);
+}
+
+void bnAllowAssemblyKernel(bool allowed) noexcept {
+#if defined(TESSEL_HAVE_ADX_KERNEL)
+  g_adxAllowed.store(allowed, std::memory_order_relaxed);
+#else
+  (void)allowed;
+#endif
 }
 
 bool bnModExpPortable(const BigNumber& base, const BigNumber& exponent, const BigNumber& modulus,

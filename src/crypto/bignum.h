@@ -69,4 +69,9 @@ bool bnModExp(const BigNumber& base, const BigNumber& exponent, const BigNumber&
 bool bnModExpPortable(const BigNumber& base, const BigNumber& exponent, const BigNumber& modulus,
                       BigNumber& result) noexcept;
 
+// On x86-64 CPUs with BMI2 and ADX the 64-bit Montgomery rows run in a small assembly kernel.
+// Tests and benchmarks pass false to force the portable C rows (the default is true), so both
+// are checked on such machines. Affects only contexts set up afterwards.
+void bnAllowAssemblyKernel(bool allowed) noexcept;
+
 }  // namespace tessel
