@@ -8,6 +8,7 @@
 // exception can cross into the JVM (jni::shield). The setters live in native_settings.cpp.
 #include <jni.h>
 
+#include <cmath>
 #include <cstdint>
 
 #include "crypto/error_table.h"
@@ -142,7 +143,9 @@ JNIEXPORT jint JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_setNativeTouchPos(J
                                                                                jint action, jfloat x,
                                                                                jfloat y) {
   KeyboardSession* s = sessionAt(handle);
-  if (s == nullptr) return jni::kRefused;
+  // NaN passes every margin comparison and would reach the key arithmetic: refuse it here, as
+  // a touch outside the surface is refused.
+  if (s == nullptr || std::isnan(x) || std::isnan(y)) return jni::kRefused;
   return jni::shield<jint>(jni::kRefused, [&] { return tessel::touch(*s, action, x, y); });
 }
 

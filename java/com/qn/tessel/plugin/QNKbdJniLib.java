@@ -325,7 +325,8 @@ public final class QNKbdJniLib {
    * Application key from the hex of a 20-byte key-blob header followed by the key bytes, least
    * significant first; the reversed bytes are read as DER (white space in the hex is skipped).
    *
-   * @return 1 when the hex decodes (even if the key is then refused and cleared); 0 otherwise
+   * @return 1 once the text was read, also when the key it holds is refused (the key is then
+   *     cleared); 0 for a null text or a bad handle
    */
   public static native int setNativePublicKeyAppBlob(int handle, String blobHex);
 

@@ -1,0 +1,60 @@
+# Suites that check libTesselVIP.so from the outside (included by tests/CMakeLists.txt):
+#   jni_exports     the dynamic symbol table holds exactly the 51 native methods of QNKbdJniLib;
+#   jvm_suite       a real JVM loads the library and drives keyboards through QNKbdJniLib only,
+#                   with GL surfaces on offscreen GLES 1.1 contexts (libtessel_egl_test.so) and
+#                   the outputs opened by the server-side tool (tessel_open);
+# plus the build-time check that the native entry points match the header javac -h writes.
+# The JVM suite is labelled nosan: a sanitized library cannot be loaded into an uninstrumented JVM.
+if(NOT TARGET TesselVIP OR NOT TARGET tessel_java)
+  message(STATUS "libTesselVIP.so or the managed class is not built: JVM suites skipped")
+  return()
+endif()
+
+find_package(Java COMPONENTS Runtime Development)
+include(UseJava)
+set(TESSEL_JVM_DIR "${CMAKE_CURRENT_LIST_DIR}/jvm")
+get_target_property(TESSEL_JNI_HEADER_DIR tessel_jni_headers INTERFACE_INCLUDE_DIRECTORIES)
+
+# Compile-only: every Java_* definition against the javac-generated declaration.
+add_library(tessel_jni_signatures OBJECT "${TESSEL_JVM_DIR}/jni_signatures.cpp")
+target_include_directories(tessel_jni_signatures PRIVATE
+  "${PROJECT_SOURCE_DIR}/src" ${TESSEL_JNI_INCLUDE} ${TESSEL_JNI_MD_HINT})
+target_link_libraries(tessel_jni_signatures PRIVATE tessel_jni_headers)
+target_compile_options(tessel_jni_signatures PRIVATE ${TESSEL_WARNINGS})
+
+add_test(NAME jni_exports
+  COMMAND ${CMAKE_COMMAND} -DNM=${CMAKE_NM} -DLIBRARY=$<TARGET_FILE:TesselVIP>
+          -DHEADER=${TESSEL_JNI_HEADER_DIR}/com_qn_tessel_plugin_QNKbdJniLib.h
+          -P "${TESSEL_JVM_DIR}/check_exports.cmake")
+set_tests_properties(jni_exports PROPERTIES TIMEOUT 60)
+
+if(NOT TESSEL_EGL_LIBRARY OR NOT TARGET tessel_open OR NOT Java_JAVA_EXECUTABLE)
+  message(STATUS "EGL, tessel_open or a Java runtime missing: jvm_suite skipped")
+  return()
+endif()
+
+# Test-only JNI helper: an offscreen GLES 1.1 context per renderer thread.
+add_library(tessel_egl_test SHARED "${TESSEL_JVM_DIR}/native/egl_helper.cpp")
+target_include_directories(tessel_egl_test PRIVATE ${TESSEL_JNI_INCLUDE} ${TESSEL_JNI_MD_HINT})
+target_link_libraries(tessel_egl_test PRIVATE ${TESSEL_EGL_LIBRARY} ${TESSEL_GLES_LIBRARY})
+target_compile_options(tessel_egl_test PRIVATE ${TESSEL_WARNINGS})
+
+file(GLOB TESSEL_JVM_SOURCES CONFIGURE_DEPENDS "${TESSEL_JVM_DIR}/com/qn/tessel/test/*.java")
+set(CMAKE_JAVA_COMPILE_FLAGS -encoding UTF-8 -Xlint:all -Xlint:-options -Werror)
+add_jar(tessel_jvm_tests SOURCES ${TESSEL_JVM_SOURCES} INCLUDE_JARS tessel_java OUTPUT_NAME TesselJvmTests)
+get_target_property(TESSEL_JVM_TESTS_JAR tessel_jvm_tests JAR_FILE)
+get_target_property(TESSEL_JAVA_JAR_FILE tessel_java JAR_FILE)
+
+set(TESSEL_JVM_TMP "${CMAKE_CURRENT_BINARY_DIR}/output/jvm")
+file(MAKE_DIRECTORY "${TESSEL_JVM_TMP}")
+add_test(NAME jvm_suite
+  COMMAND ${Java_JAVA_EXECUTABLE} -Xcheck:jni
+          -Dtessel.library=$<TARGET_FILE:TesselVIP>
+          -Dtessel.eglHelper=$<TARGET_FILE:tessel_egl_test>
+          -Dtessel.server=$<TARGET_FILE:tessel_open>
+          -Dtessel.appKey=${CMAKE_CURRENT_LIST_DIR}/data/builtin_default_key.pem
+          -Dtessel.tmp=${TESSEL_JVM_TMP}
+          -cp "${TESSEL_JVM_TESTS_JAR}:${TESSEL_JAVA_JAR_FILE}"
+          com.qn.tessel.test.JvmSuite)
+set_tests_properties(jvm_suite PROPERTIES TIMEOUT 300 LABELS nosan
+  FAIL_REGULAR_EXPRESSION "WARNING in native method|FATAL ERROR in native method")

@@ -1,0 +1,80 @@
+package com.qn.tessel.test;
+
+import java.util.Arrays;
+import java.util.Objects;
+
+/**
+ * The suite's assertions: each failed check is counted and printed with the name of the case it
+ * belongs to, and the case goes on, so one run reports every broken expectation. A case that
+ * throws is reported as failed at that point.
+ */
+final class Check {
+  private static int checks;
+  private static int failures;
+  private static String current = "";
+
+  private Check() {}
+
+  interface Body {
+    void run() throws Exception;
+  }
+
+  static void test(String name, Body body) {
+    current = name;
+    final int before = failures;
+    final long start = System.nanoTime();
+    try {
+      body.run();
+    } catch (Throwable t) {
+      fail("threw " + t);
+      t.printStackTrace(System.out);
+    }
+    final long ms = (System.nanoTime() - start) / 1_000_000;
+    System.out.printf("[%s] %s (%d ms)%n", failures == before ? "  OK  " : "FAILED", name, ms);
+  }
+
+  static void fail(String message) {
+    ++failures;
+    System.out.println("    " + current + ": " + message);
+  }
+
+  static void isTrue(boolean condition, String what) {
+    ++checks;
+    if (!condition) fail(what);
+  }
+
+  static void equal(long expected, long actual, String what) {
+    ++checks;
+    if (expected != actual) fail(what + ": expected " + expected + ", got " + actual);
+  }
+
+  static void equal(Object expected, Object actual, String what) {
+    ++checks;
+    if (!Objects.equals(expected, actual)) fail(what + ": expected <" + expected + ">, got <" + actual + ">");
+  }
+
+  static void equalBytes(byte[] expected, byte[] actual, String what) {
+    ++checks;
+    if (!Arrays.equals(expected, actual)) {
+      fail(what + ": expected " + Arrays.toString(expected) + ", got " + Arrays.toString(actual));
+    }
+  }
+
+  static void isNull(Object value, String what) {
+    ++checks;
+    if (value != null) fail(what + ": expected null, got <" + value + ">");
+  }
+
+  static void notNull(Object value, String what) {
+    ++checks;
+    if (value == null) fail(what + ": expected a value, got null");
+  }
+
+  static int failures() {
+    return failures;
+  }
+
+  static int checks() {
+    return checks;
+  }
+}

@@ -1,0 +1,183 @@
+package com.qn.tessel.test;
+
+import static com.qn.tessel.plugin.QNKbdJniLib.*;
+
+import java.util.ArrayList;
+import java.util.List;
+
+/**
+ * Every entry point with handles that name no session (negative, empty slots 0 and 19, 20 and
+ * beyond) and with null arguments: each must return its documented value and change nothing.
+ * Also the session table as seen from Java: create, find again by name, evict, destroy.
+ */
+final class EntryPointTests {
+  private EntryPointTests() {}
+
+  interface Call {
+    Object call(int handle);
+  }
+
+  /** One method: what it returns for a negative handle and for a non-negative one without a session. */
+  static final class Row {
+    final String name;
+    final Call call;
+    final Object negative;
+    final Object noSession;
+
+    Row(String name, Object negative, Object noSession, Call call) {
+      this.name = name;
+      this.call = call;
+      this.negative = negative;
+      this.noSession = noSession;
+    }
+  }
+
+  static Row row(String name, Object refused, Call call) {
+    return new Row(name, refused, refused, call);
+  }
+
+  static Row sink(String name, Call call) {  // methods without a result
+    return new Row(name, null, null, h -> {
+      call.call(h);
+      return null;
+    });
+  }
+
+  /** The 50 methods that take a handle, each with valid arguments apart from the handle. */
+  static List<Row> rows() {
+    final byte[] challenge = {'c', 'o', 'd', 'e'};
+    List<Row> rows = new ArrayList<>();
+    rows.add(sink("destroyNativeSession", h -> { destroyNativeSession(h); return null; }));
+    rows.add(sink("setNativeSurfaceCreated", h -> { setNativeSurfaceCreated(h); return null; }));
+    rows.add(sink("setNativeSurfaceChanged", h -> { setNativeSurfaceChanged(h, 480, 320, 1); return null; }));
+    rows.add(sink("setNativeDrawFrame", h -> { setNativeDrawFrame(h); return null; }));
+    rows.add(sink("setNativePopSurfaceCreated", h -> { setNativePopSurfaceCreated(h); return null; }));
+    rows.add(sink("setNativePopSurfaceChanged", h -> { setNativePopSurfaceChanged(h, 480, 80); return null; }));
+    rows.add(sink("setNativePopDrawFrame", h -> { setNativePopDrawFrame(h, true); return null; }));
+    rows.add(sink("setNativePopTopSurfaceCreated", h -> { setNativePopTopSurfaceCreated(h); return null; }));
+    rows.add(sink("setNativePopTopSurfaceChanged", h -> { setNativePopTopSurfaceChanged(h, 96, 160); return null; }));
+    rows.add(sink("setNativePopTopDrawFrame", h -> { setNativePopTopDrawFrame(h); return null; }));
+    rows.add(row("setNativeTouchPos", -1, h -> setNativeTouchPos(h, TOUCH_UP, 100f, 100f)));
+    rows.add(row("getNativeContentLen", -1, h -> getNativeContentLen(h)));
+    rows.add(row("getNativeContent", null, h -> getNativeContent(h, "20260101120000")));
+    rows.add(row("getNativePinContent", null, h -> getNativePinContent(h, "20260101120000")));
+    rows.add(row("clearNativePlaintext", -1, h -> clearNativePlaintext(h)));
+    rows.add(row("getNativeDegree", (short) -1, h -> getNativeDegree(h)));
+    rows.add(row("getNativeVerify", -1, h -> getNativeVerify(h)));
+    rows.add(new Row("getNativeVersion", -1L, VERSION, h -> getNativeVersion(h)));
+    rows.add(new Row("getNativeStringVersion", null, VERSION_TEXT, h -> getNativeStringVersion(h)));
+    rows.add(row("getNativeLastError", null, h -> getNativeLastError(h)));
+    rows.add(row("getNativeEncryptedPinCode", null, h -> getNativeEncryptedPinCode(h)));
+    rows.add(row("getNativeMeasureValue", null, h -> getNativeMeasureValue(h)));
+    rows.add(sink("setNativeEncryptType", h -> { setNativeEncryptType(h, (byte) 48); return null; }));
+    rows.add(sink("setNativeAppPlat", h -> { setNativeAppPlat(h, "C0FFEE", false); return null; }));
+    rows.add(sink("setNativeEncryPlat", h -> { setNativeEncryPlat(h, "C0FFEE", false); return null; }));
+    rows.add(row("setNativePublicKeyAppModulus", 0, h -> setNativePublicKeyAppModulus(h, "C0FFEE")));
+    rows.add(row("setNativePublicKeyAppDER", 0, h -> setNativePublicKeyAppDER(h, "3006020100020100")));
+    rows.add(row("setNativePublicKeyAppBlob", 0, h -> setNativePublicKeyAppBlob(h, "0602")));
+    rows.add(row("setNativePublicKeyModulus", 0, h -> setNativePublicKeyModulus(h, "C0FFEE")));
+    rows.add(row("setNativePublicKeyDER", 0, h -> setNativePublicKeyDER(h, "3006020100020100")));
+    rows.add(row("setNativePublicKeyBlob", 0, h -> setNativePublicKeyBlob(h, "0602")));
+    rows.add(row("setNativePublicKeyECC", 0, h -> setNativePublicKeyECC(h, "01", "02")));
+    rows.add(sink("setNativeAccepts", h -> { setNativeAccepts(h, "[:print:]*"); return null; }));
+    rows.add(sink("setNativeMinLength", h -> { setNativeMinLength(h, (short) 6); return null; }));
+    rows.add(sink("setNativeMaxLength", h -> { setNativeMaxLength(h, (short) 16); return null; }));
+    rows.add(sink("setNativeKbdRandom", h -> { setNativeKbdRandom(h, true); return null; }));
+    rows.add(sink("setNativeKbdVibrator", h -> { setNativeKbdVibrator(h, 1); return null; }));
+    rows.add(sink("setNativeKbdType", h -> { setNativeKbdType(h, (short) 1); return null; }));
+    rows.add(sink("setNativeKbdStyle", h -> { setNativeKbdStyle(h, (short) 3); return null; }));
+    rows.add(sink("setNativeKbdMode", h -> { setNativeKbdMode(h, (short) 1); return null; }));
+    rows.add(sink("setNativeChallengeCode", h -> { setNativeChallengeCode(h, challenge); return null; }));
+    rows.add(sink("setNativeKbdFactor", h -> { setNativeKbdFactor(h, "2xyz"); return null; }));
+    rows.add(sink("setNativeContentType", h -> { setNativeContentType(h, 7); return null; }));
+    rows.add(sink("setNativeMode", h -> { setNativeMode(h, (short) 4); return null; }));
+    rows.add(sink("setNativeAlgorithmCode", h -> { setNativeAlgorithmCode(h, "123"); return null; }));
+    rows.add(sink("setNativeHashRandom", h -> { setNativeHashRandom(h, "1:salt"); return null; }));
+    rows.add(sink("setNativeDictionaryFilter", h -> { setNativeDictionaryFilter(h, "a,b"); return null; }));
+    rows.add(sink("setNativePopMode", h -> { setNativePopMode(h, false); return null; }));
+    rows.add(sink("setNativeSwitchMode", h -> { setNativeSwitchMode(h, (short) 1); return null; }));
+    rows.add(sink("setNativeFinishMode", h -> { setNativeFinishMode(h, (short) 1); return null; }));
+    return rows;
+  }
+
+  static void run() throws Exception {
+    Check.test("the sweep covers the 50 methods that take a handle", () -> Check.equal(50, rows().size(), "rows"));
+
+    Check.test("handles without a session return the documented values", () -> {
+      JvmSuite.destroyAll();
+      final int[] handles = {-1, -20, Integer.MIN_VALUE, 0, 19, 20, 1000, Integer.MAX_VALUE};
+      for (int h : handles) {
+        for (Row r : rows()) {
+          Object got = r.call.call(h);
+          Check.equal(h < 0 ? r.negative : r.noSession, got, r.name + "(" + h + ")");
+        }
+      }
+      // Nothing above may have brought a session to life.
+      for (int h = 0; h < SESSION_SLOTS; ++h) Check.equal(-1, getNativeContentLen(h), "slot " + h + " empty");
+      Check.equal(0, createNativeSession("first"), "the first create after the sweep takes slot 0");
+      JvmSuite.destroyAll();
+    });
+
+    Check.test("null arguments on a live session", () -> {
+      JvmSuite.destroyAll();
+      Check.equal(-1, createNativeSession(null), "createNativeSession(null)");
+      int h = createNativeSession("nulls");
+      Check.equal(0, h, "handle");
+      Check.equal(0, setNativePublicKeyAppModulus(h, null), "setNativePublicKeyAppModulus(null)");
+      Check.equal(0, setNativePublicKeyAppDER(h, null), "setNativePublicKeyAppDER(null)");
+      Check.equal(0, setNativePublicKeyAppBlob(h, null), "setNativePublicKeyAppBlob(null)");
+      Check.equal(0, setNativePublicKeyModulus(h, null), "setNativePublicKeyModulus(null)");
+      Check.equal(0, setNativePublicKeyDER(h, null), "setNativePublicKeyDER(null)");
+      Check.equal(0, setNativePublicKeyBlob(h, null), "setNativePublicKeyBlob(null)");
+      Check.equal(0, setNativePublicKeyECC(h, null, "02"), "setNativePublicKeyECC(null, y)");
+      Check.equal(0, setNativePublicKeyECC(h, "01", null), "setNativePublicKeyECC(x, null)");
+      Check.equal(0, setNativePublicKeyECC(h, null, null), "setNativePublicKeyECC(null, null)");
+      setNativeAppPlat(h, null, false);
+      setNativeEncryPlat(h, null, true);
+      setNativeAccepts(h, null);
+      setNativeKbdFactor(h, null);
+      setNativeAlgorithmCode(h, null);
+      setNativeHashRandom(h, null);
+      setNativeDictionaryFilter(h, null);
+      setNativeChallengeCode(h, null);
+      Check.isNull(getNativePinContent(h, null), "getNativePinContent(null timestamp)");
+      Check.isNull(getNativeContent(h, null), "getNativeContent(null timestamp)");
+      Check.equal("The timestamp is missing!", getNativeLastError(h), "last error after a null timestamp");
+      Check.isNull(getNativeEncryptedPinCode(h), "no challenge code after setNativeChallengeCode(null)");
+      Check.equal("Challenge code is empty", getNativeLastError(h), "last error without a challenge code");
+      // The session is still whole: an empty content rates 'E' and verifies as empty.
+      Check.equal((short) 'E', getNativeDegree(h), "degree of the empty content");
+      Check.equal(VERIFY_EMPTY, getNativeVerify(h), "verify of the empty content");
+      Check.equal(0, getNativeContentLen(h), "length");
+      destroyNativeSession(h);
+    });
+
+    Check.test("sessions: create, find by name, evict in slot order, destroy", () -> {
+      JvmSuite.destroyAll();
+      for (int k = 0; k < SESSION_SLOTS; ++k) Check.equal(k, createNativeSession("s" + k), "create s" + k);
+      Check.equal(5, createNativeSession("s5"), "same name, same handle");
+      Check.equal("No Error!", getNativeLastError(5), "a fresh session has no error");
+      Check.equal(0, createNativeSession("s20"), "21st name evicts slot 0 (after 19, created last)");
+      Check.equal(1, createNativeSession("s0"), "s0 is gone: recreated in the slot after 0");
+      Check.equal(19, createNativeSession("s19"), "s19 still lives");
+      Check.equal(0, createNativeSession("s20"), "s20 lives in slot 0");
+      destroyNativeSession(7);
+      Check.equal(-1, getNativeContentLen(7), "destroyed slot is refused");
+      Check.equal(7, createNativeSession("again"), "a free slot is taken before any eviction");
+      destroyNativeSession(7);
+      destroyNativeSession(7);  // twice: ignored
+      Check.equal(-1, getNativeContentLen(7), "still empty");
+      JvmSuite.destroyAll();
+      Check.equal(0, createNativeSession("s5"), "after destroying all, slot 0 first");
+      JvmSuite.destroyAll();
+    });
+
+    Check.test("version for any handle >= 0", () -> {
+      final int[] handles = {0, 5, 19, 20, 12345};
+      for (int h : handles) {
+        Check.equal(3070005L, getNativeVersion(h), "getNativeVersion(" + h + ")");
+        Check.equal("3.7.0.5", getNativeStringVersion(h), "getNativeStringVersion(" + h + ")");
+      }
+    });
+  }
+}

@@ -1,0 +1,109 @@
+package com.qn.tessel.test;
+
+import static com.qn.tessel.plugin.QNKbdJniLib.*;
+
+import com.qn.tessel.plugin.QNKbdJniLib;
+import java.io.File;
+import java.nio.charset.StandardCharsets;
+import java.nio.file.Files;
+import java.security.KeyPair;
+import java.security.KeyPairGenerator;
+import java.security.interfaces.RSAPublicKey;
+
+/**
+ * The JVM suite: loads the built libTesselVIP.so into a real JVM and drives keyboards only
+ * through com.qn.tessel.plugin.QNKbdJniLib, as an app does. Run by CTest (tests/jvm.cmake) with
+ * the paths it needs as system properties:
+ *   tessel.library     libTesselVIP.so                tessel.eglHelper  libtessel_egl_test.so
+ *   tessel.server      the tessel_open opener         tessel.appKey     builtin_default_key.pem
+ *   tessel.tmp         a scratch directory
+ * Exit status 0 when every check passed.
+ */
+public final class JvmSuite {
+  /** Keyboard surface size used by every case: keys of 48 x 80 pixels. */
+  static final int WIDTH = 480;
+  static final int HEIGHT = 320;
+  static final String TIMESTAMP = "20260101120000";
+
+  static ServerTool server;
+  static String encKeyPem;
+  static String encModulusHex;
+  static RSAPublicKey encPublicKey;
+
+  private JvmSuite() {}
+
+  static String property(String name) {
+    String v = System.getProperty(name);
+    if (v == null || v.isEmpty()) throw new IllegalStateException("system property " + name + " is not set");
+    return v;
+  }
+
+  /** Releases every slot, so cases that count on empty slots start from a known table. */
+  static void destroyAll() {
+    for (int h = 0; h < SESSION_SLOTS; ++h) destroyNativeSession(h);
+  }
+
+  /**
+   * A session ready for typing: long enough maximum length, every printable character accepted,
+   * the layout built and the grid set on the given GL thread (variant 1).
+   */
+  static KeyboardDriver keyboard(EglContext gl, String name) throws Exception {
+    int h = createNativeSession(name);
+    Check.isTrue(h >= 0 && h < SESSION_SLOTS, "handle of " + name);
+    setNativeMaxLength(h, (short) 64);
+    setNativeAccepts(h, "[:print:]*");
+    surface(gl, h);
+    return new KeyboardDriver(h, WIDTH, HEIGHT);
+  }
+
+  static void surface(EglContext gl, int h) throws Exception {
+    gl.run(() -> {
+      setNativeSurfaceCreated(h);
+      setNativeSurfaceChanged(h, WIDTH, HEIGHT, 1);
+    });
+  }
+
+  /** The typed text as the bank's server reads it from getNativeContent (type 48). */
+  static String serverContent(int h) throws Exception {
+    String out = getNativeContent(h, TIMESTAMP);
+    if (out == null) {
+      Check.fail("getNativeContent returned null: " + getNativeLastError(h));
+      return null;
+    }
+    ServerTool.Result r = server.open(48, out, null);
+    Check.equal(0, r.exitCode, "tessel_open type 48 " + r);
+    Check.equal(TIMESTAMP, r.get("timestamp"), "timestamp in the envelope");
+    return r.get("content");
+  }
+
+  private static void setUp() throws Exception {
+    System.load(property("tessel.eglHelper"));
+    // The library is loaded here, before the class is initialised: its own System.loadLibrary
+    // then fails (the build directory is not on java.library.path) and must not matter.
+    System.load(property("tessel.library"));
+    server = new ServerTool(property("tessel.server"), property("tessel.appKey"));
+    KeyPairGenerator generator = KeyPairGenerator.getInstance("RSA");
+    generator.initialize(1024);
+    KeyPair enc = generator.generateKeyPair();
+    encPublicKey = (RSAPublicKey) enc.getPublic();
+    encModulusHex = Oracles.modulusHex(encPublicKey);
+    File pem = new File(property("tessel.tmp"), "enc_platform_key.pem");
+    Files.write(pem.toPath(), Oracles.pkcs8Pem(enc.getPrivate()).getBytes(StandardCharsets.US_ASCII));
+    encKeyPem = pem.getPath();
+  }
+
+  public static void main(String[] args) throws Exception {
+    setUp();
+    Check.test("the class reaches the library loaded by the test", () -> {
+      Check.isTrue(QNKbdJniLib.isAvailable(), "isAvailable");
+      Check.notNull(QNKbdJniLib.libraryLoadFailure(), "the class's own loadLibrary failed as expected");
+    });
+    EntryPointTests.run();
+    KeyboardTests.run();
+    OutputTests.run();
+    RenderTests.run();
+    destroyAll();
+    System.out.printf("%d checks, %d failed%n", Check.checks(), Check.failures());
+    System.exit(Check.failures() == 0 ? 0 : 1);
+  }
+}

@@ -1,0 +1,151 @@
+package com.qn.tessel.test;
+
+import static com.qn.tessel.plugin.QNKbdJniLib.setNativeTouchPos;
+
+import com.qn.tessel.plugin.QNKbdJniLib;
+
+/**
+ * Types through the keyboard the way a finger does: computes key centres from the surface size
+ * the app passed to setNativeSurfaceChanged (10 columns and 4 rows of keys; row 1 shifted right
+ * by 0.3 key, row 2 between shift and delete; the number pad as four columns of 2.5 keys) and
+ * sends a down and an up at each. It tracks the page and shift state its own taps produce, so
+ * it knows the unshuffled layout's keys only: use it with random layout off, or for positions.
+ */
+final class KeyboardDriver {
+  static final String[] LETTERS = {"qwertyuiop", "asdfghjkl", "zxcvbnm"};
+  static final String[] SYMBOLS = {"1234567890", "`~!@#$%^&", "*()-_=+"};
+  static final String[] SYMBOLS_SHIFTED = {"1234567890", "{}[]\\|:;'", "\",.<>/?"};
+  static final String PAD = "1234567890";
+
+  final int handle;
+  final double width;
+  final double height;
+  final double kw;
+  final double kh;
+  boolean symbolPage;
+  boolean shift;
+
+  KeyboardDriver(int handle, int width, int height) {
+    this.handle = handle;
+    this.width = width;
+    this.height = height;
+    this.kw = width / 10.0;
+    this.kh = height / 4.0;
+  }
+
+  /** A down then an up at (x, y): the down must report -1; returns what the up reports. */
+  int tap(double x, double y) {
+    int down = setNativeTouchPos(handle, QNKbdJniLib.TOUCH_DOWN, (float) x, (float) y);
+    Check.equal(-1, down, "down at (" + x + ", " + y + ")");
+    return setNativeTouchPos(handle, QNKbdJniLib.TOUCH_UP, (float) x, (float) y);
+  }
+
+  // ---- full keyboard: layout position 0..25 and the function keys
+
+  double[] positionCentre(int position) {
+    if (position < 10) return new double[] {(position + 0.5) * kw, 0.5 * kh};
+    if (position < 19) return new double[] {(position - 10 + 0.8) * kw, 1.5 * kh};
+    return new double[] {(position - 19 + 2) * kw, 2.5 * kh};
+  }
+
+  int tapPosition(int position) {
+    double[] c = positionCentre(position);
+    return tap(c[0], c[1]);
+  }
+
+  int shiftKey() {
+    int r = tap(0.75 * kw, 2.5 * kh);
+    shift = !shift;
+    return r;
+  }
+
+  int deleteKey() {
+    return tap(9.25 * kw, 2.5 * kh);
+  }
+
+  /** The switch key with switch mode 0: toggles letters and symbols. */
+  int switchKey() {
+    int r = tap(1.25 * kw, 3.5 * kh);
+    symbolPage = !symbolPage;
+    return r;
+  }
+
+  int spaceKey() {
+    return tap(5 * kw, 3.5 * kh);
+  }
+
+  int doneKey() {
+    return tap(8.75 * kw, 3.5 * kh);
+  }
+
+  private static int find(String[] rows, char c) {
+    int base = 0;
+    for (String row : rows) {
+      int at = row.indexOf(c);
+      if (at >= 0) return base + at;
+      base += row.length();
+    }
+    return -1;
+  }
+
+  /** Types one character of the unshuffled full keyboard, switching page and shift as needed. */
+  void type(char c) {
+    if (c == ' ') {
+      Check.equal(0, spaceKey(), "space key");
+      return;
+    }
+    int position;
+    boolean wantSymbols;
+    Boolean wantShift;  // null: either
+    if (c >= 'a' && c <= 'z') {
+      position = find(LETTERS, c);
+      wantSymbols = false;
+      wantShift = false;
+    } else if (c >= 'A' && c <= 'Z') {
+      position = find(LETTERS, Character.toLowerCase(c));
+      wantSymbols = false;
+      wantShift = true;
+    } else if (c >= '0' && c <= '9') {
+      position = find(SYMBOLS, c);
+      wantSymbols = true;
+      wantShift = null;
+    } else if (find(SYMBOLS, c) >= 0) {
+      position = find(SYMBOLS, c);
+      wantSymbols = true;
+      wantShift = false;
+    } else {
+      position = find(SYMBOLS_SHIFTED, c);
+      wantSymbols = true;
+      wantShift = true;
+    }
+    if (position < 0) throw new IllegalArgumentException("no key for " + c);
+    if (symbolPage != wantSymbols) Check.equal(0, switchKey(), "switch key");
+    if (wantShift != null && shift != wantShift) Check.equal(0, shiftKey(), "shift key");
+    Check.equal(0, tapPosition(position), "key '" + c + "'");
+  }
+
+  void type(String text) {
+    for (int k = 0; k < text.length(); ++k) type(text.charAt(k));
+  }
+
+  // ---- number pad: cell (row, column), columns 2.5 keys wide
+
+  int tapPad(int row, int column) {
+    return tap((column + 0.5) * 2.5 * kw, (row + 0.5) * kh);
+  }
+
+  /** Types a digit or '.' on the number pad. */
+  void typePad(char c) {
+    if (c == '.') {
+      Check.equal(0, tapPad(3, 1), "pad '.'");
+      return;
+    }
+    int at = PAD.indexOf(c);
+    if (at < 0) throw new IllegalArgumentException("no pad key for " + c);
+    Check.equal(0, tapPad(at / 3, at % 3), "pad '" + c + "'");
+  }
+
+  void typePad(String text) {
+    for (int k = 0; k < text.length(); ++k) typePad(text.charAt(k));
+  }
+}

@@ -1,0 +1,201 @@
+package com.qn.tessel.test;
+
+import static com.qn.tessel.plugin.QNKbdJniLib.*;
+import static com.qn.tessel.test.JvmSuite.TIMESTAMP;
+import static com.qn.tessel.test.JvmSuite.WIDTH;
+import static com.qn.tessel.test.JvmSuite.HEIGHT;
+import static com.qn.tessel.test.JvmSuite.keyboard;
+import static com.qn.tessel.test.JvmSuite.serverContent;
+
+import java.math.BigInteger;
+
+/**
+ * What an app gets out of a session, checked against independent parties: the envelopes of
+ * getNativeContent / getNativePinContent opened by the server-side tool (with the private key of
+ * the built-in modulus and a key pair the JVM generated for the encryption platform), the
+ * encrypted PIN code against RC4 over the JVM's SHA-1, salted hashes against the JVM's MD5, the
+ * degree letters and verify codes against documented examples, and the last-error texts.
+ */
+final class OutputTests {
+  private OutputTests() {}
+
+  /** Opens getNativePinContent (type 47) with both keys; returns the opened content or null. */
+  static String pinContent(KeyboardDriver k) throws Exception {
+    String out = getNativePinContent(k.handle, TIMESTAMP);
+    if (out == null) return null;
+    ServerTool.Result r = JvmSuite.server.open(47, out, JvmSuite.encKeyPem);
+    Check.equal(0, r.exitCode, "tessel_open type 47 " + r);
+    Check.equal(TIMESTAMP, r.get("timestamp"), "timestamp");
+    Check.equal(String.valueOf((char) getNativeDegree(k.handle)), r.get("strength"),
+        "the envelope's strength letter is the session's degree");
+    return r.get("content");
+  }
+
+  static void run() throws Exception {
+    try (EglContext gl = new EglContext(WIDTH, HEIGHT)) {
+      cases(gl);
+    }
+  }
+
+  private static void cases(EglContext gl) throws Exception {
+    Check.test("content envelope: strength letter, timestamp, text; last error", () -> {
+      JvmSuite.destroyAll();
+      KeyboardDriver k = keyboard(gl, "content");
+      Check.equal("No Error!", getNativeLastError(k.handle), "before any output");
+      k.type("ab1!cd");
+      String out = getNativeContent(k.handle, TIMESTAMP);
+      Check.notNull(out, "getNativeContent");
+      ServerTool.Result r = JvmSuite.server.open(48, out, null);
+      Check.equal(0, r.exitCode, "opened " + r);
+      Check.equal("S", r.get("strength"), "strength letter");
+      Check.equal("ab1!cd", r.get("content"), "content");
+      Check.equal("No Error!", getNativeLastError(k.handle), "after a success");
+      Check.isTrue(!out.equals(getNativeContent(k.handle, TIMESTAMP)), "a fresh session key every call");
+      Check.isNull(getNativeContent(k.handle, null), "no timestamp");
+      Check.equal("The timestamp is missing!", getNativeLastError(k.handle), "its error");
+      Check.isNull(getNativePinContent(k.handle, TIMESTAMP), "PIN content without an encryption key");
+      Check.equal("The encryption platform modulus is missing!", getNativeLastError(k.handle), "its error");
+      Check.equal(6, getNativeContentLen(k.handle), "outputs leave the text in place");
+      Check.equal("ab1!cd", serverContent(k.handle), "and readable again");
+      destroyNativeSession(k.handle);
+    });
+
+    Check.test("PIN content with the encryption key as modulus, DER and key blob", () -> {
+      JvmSuite.destroyAll();
+      KeyboardDriver k = keyboard(gl, "pin");
+      k.type("Pin 2468");
+      BigInteger n = JvmSuite.encPublicKey.getModulus();
+      String der = Oracles.hex(Oracles.rsaPublicKeyDer(n, BigInteger.valueOf(65537)), true);
+      String blob = Oracles.hex(Oracles.keyBlob(Oracles.rsaPublicKeyDer(n, BigInteger.valueOf(65537))), true);
+
+      Check.equal(1, setNativePublicKeyModulus(k.handle, JvmSuite.encModulusHex), "modulus");
+      Check.equal("Pin 2468", pinContent(k), "opened with the encryption key (modulus)");
+
+      Check.equal(1, setNativePublicKeyDER(k.handle, der.toLowerCase(java.util.Locale.ROOT)), "DER");
+      Check.equal("Pin 2468", pinContent(k), "opened (DER)");
+
+      String spaced = blob.substring(0, 40) + " \n\t" + blob.substring(40);
+      Check.equal(1, setNativePublicKeyBlob(k.handle, spaced), "blob with white space");
+      Check.equal("Pin 2468", pinContent(k), "opened (blob)");
+
+      setNativeEncryPlat(k.handle, der, true);
+      Check.equal("Pin 2468", pinContent(k), "opened (setNativeEncryPlat DER)");
+      setNativeEncryPlat(k.handle, JvmSuite.encModulusHex, false);
+      Check.equal("Pin 2468", pinContent(k), "opened (setNativeEncryPlat modulus)");
+
+      // Keys that are refused clear the field: the PIN content then fails.
+      String exponent3 = Oracles.hex(Oracles.rsaPublicKeyDer(n, BigInteger.valueOf(3)), true);
+      Check.equal(1, setNativePublicKeyDER(k.handle, exponent3), "DER with exponent 3 (still 1)");
+      Check.isNull(getNativePinContent(k.handle, TIMESTAMP), "no key after a refused DER");
+      Check.equal("The encryption platform modulus is missing!", getNativeLastError(k.handle), "error");
+      Check.equal(1, setNativePublicKeyModulus(k.handle, JvmSuite.encModulusHex), "modulus again");
+      Check.equal(1, setNativePublicKeyBlob(k.handle, Oracles.hex(Oracles.keyBlob(new byte[] {1, 2, 3}), true)),
+          "blob whose key is not DER (still 1)");
+      Check.isNull(getNativePinContent(k.handle, TIMESTAMP), "no key after a refused blob");
+      Check.equal(1, setNativePublicKeyModulus(k.handle, JvmSuite.encModulusHex), "modulus again");
+      Check.equal(1, setNativePublicKeyBlob(k.handle, "12G4"), "blob of bad hex (still 1)");
+      Check.isNull(getNativePinContent(k.handle, TIMESTAMP), "no key after an unreadable blob");
+      Check.equal(1, setNativePublicKeyModulus(k.handle, JvmSuite.encModulusHex), "modulus again");
+      Check.equal("Pin 2468", pinContent(k), "opened (modulus)");
+      // The content output keeps using the built-in key whatever the encryption key is.
+      Check.equal("Pin 2468", serverContent(k.handle), "content (type 48) unaffected");
+      destroyNativeSession(k.handle);
+    });
+
+    Check.test("salted hash replaces the text in both outputs", () -> {
+      JvmSuite.destroyAll();
+      KeyboardDriver k = keyboard(gl, "hash");
+      k.type("secret9");
+      setNativeHashRandom(k.handle, "3:pepper");  // refused: no suffix yet
+      setNativeHashRandom(k.handle, "1pepper");   // refused
+      Check.equal("secret9", serverContent(k.handle), "refused hash randoms leave the text");
+      setNativeHashRandom(k.handle, "1:pepper");
+      Check.equal(Oracles.saltedHash("secret9", "pepper", 'S'), serverContent(k.handle), "mode S: 16 digits");
+      setNativeHashRandom(k.handle, "2:salt:with:colons");
+      Check.equal(Oracles.saltedHash("secret9", "salt:with:colons", 'F'), serverContent(k.handle),
+          "mode F: 32 digits");
+      Check.equal(1, setNativePublicKeyModulus(k.handle, JvmSuite.encModulusHex), "encryption key");
+      Check.equal(Oracles.saltedHash("secret9", "salt:with:colons", 'F'), pinContent(k), "PIN content, hashed");
+      clearNativePlaintext(k.handle);
+      Check.isNull(getNativeContent(k.handle, TIMESTAMP), "an empty password cannot be hashed");
+      Check.equal("The format of the text is wrong!", getNativeLastError(k.handle), "its error");
+      destroyNativeSession(k.handle);
+    });
+
+    Check.test("encrypted PIN code is RC4 under SHA-1 of the challenge", () -> {
+      JvmSuite.destroyAll();
+      KeyboardDriver k = keyboard(gl, "pincode");
+      Check.isNull(getNativeEncryptedPinCode(k.handle), "no challenge code");
+      Check.equal("Challenge code is empty", getNativeLastError(k.handle), "its error");
+      byte[] challenge = Oracles.ascii("challenge-4711");
+      setNativeChallengeCode(k.handle, challenge);
+      Check.isNull(getNativeEncryptedPinCode(k.handle), "no text typed");
+      Check.equal("Encryption error", getNativeLastError(k.handle), "its error");
+      k.type("0815 pin");
+      Check.equalBytes(Oracles.encryptedPinCode(challenge, "0815 pin"), getNativeEncryptedPinCode(k.handle),
+          "code");
+      Check.equal("No Error!", getNativeLastError(k.handle), "after a success");
+      setNativeChallengeCode(k.handle, new byte[0]);              // ignored
+      setNativeChallengeCode(k.handle, new byte[] {0, 'x', 'y'});  // ignored: starts with zero
+      setNativeChallengeCode(k.handle, null);                     // ignored
+      Check.equalBytes(Oracles.encryptedPinCode(challenge, "0815 pin"), getNativeEncryptedPinCode(k.handle),
+          "the first challenge is kept");
+      setNativeChallengeCode(k.handle, new byte[] {'a', 'b', 0, 'c'});
+      Check.equalBytes(Oracles.encryptedPinCode(Oracles.ascii("ab"), "0815 pin"), getNativeEncryptedPinCode(k.handle),
+          "a challenge ends at its first zero byte");
+      byte[] high = {(byte) 0xC3, (byte) 0xA9, (byte) 0xFF, 0x7F};
+      setNativeChallengeCode(k.handle, high);
+      Check.equalBytes(Oracles.encryptedPinCode(high, "0815 pin"), getNativeEncryptedPinCode(k.handle),
+          "bytes above 0x7F are taken as they are");
+      byte[] code = getNativeEncryptedPinCode(k.handle);
+      Check.isTrue(code != null && code[code.length - 1] != 0, "no terminator in the array");
+      destroyNativeSession(k.handle);
+    });
+
+    Check.test("degree letters of typed texts", () -> {
+      JvmSuite.destroyAll();
+      KeyboardDriver k = keyboard(gl, "degree");
+      final String[][] table = {  // text, letter (rule set 48)
+        {"", "E"}, {"12345", "W"}, {"123456", "W"}, {"abcdef", "W"}, {"abc123", "M"}, {"aaaa12", "W"},
+        {"ab1!cd", "S"}, {"Tessel 7!", "S"},
+      };
+      for (String[] row : table) {
+        clearNativePlaintext(k.handle);
+        k.type(row[0]);
+        Check.equal((short) row[1].charAt(0), getNativeDegree(k.handle), "degree of '" + row[0] + "'");
+        Check.equal(row[0].length(), getNativeContentLen(k.handle), "rating leaves the text");
+      }
+      destroyNativeSession(k.handle);
+    });
+
+    Check.test("verify codes from minimum length, pattern, classes and dictionary", () -> {
+      JvmSuite.destroyAll();
+      KeyboardDriver k = keyboard(gl, "verify");
+      setNativeMinLength(k.handle, (short) 6);
+      setNativeMinLength(k.handle, (short) -1);  // ignored
+      setNativeDictionaryFilter(k.handle, "123456,qwerty,x");
+      final Object[][] table = {  // text typed, content type, accepts at verify time, code
+        {"", 0, "[:alnum:]+", VERIFY_EMPTY},
+        {"abc", 0, "[:alnum:]+", VERIFY_TOO_SHORT},
+        {"abc!def", 0, "[:alnum:]+", VERIFY_PATTERN},
+        {"qwerty", 0, "[:alnum:]+", VERIFY_IN_DICTIONARY},
+        {"QWERTY", 0, "[:alnum:]+", VERIFY_OK},
+        {"abcdef", REQUIRE_DIGIT | REQUIRE_LETTER, "[:alnum:]+", VERIFY_CLASS_MISSING},
+        {"abc123", REQUIRE_DIGIT | REQUIRE_LETTER, "[:alnum:]+", VERIFY_OK},
+        {"abc123", REQUIRE_PUNCTUATION, "[:alnum:]+", VERIFY_CLASS_MISSING},
+        {"abc12!", REQUIRE_PUNCTUATION, "[:print:]+", VERIFY_OK},
+      };
+      for (Object[] row : table) {
+        String text = (String) row[0];
+        setNativeAccepts(k.handle, "[:print:]*");
+        clearNativePlaintext(k.handle);
+        k.type(text);
+        setNativeContentType(k.handle, (Integer) row[1]);
+        setNativeAccepts(k.handle, (String) row[2]);
+        Check.equal((long) (Integer) row[3], getNativeVerify(k.handle), "verify '" + text + "' type " + row[1]);
+        Check.equal(text.length(), getNativeContentLen(k.handle), "verify leaves the text");
+      }
+      destroyNativeSession(k.handle);
+    });
+  }
+}
