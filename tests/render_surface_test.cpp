@@ -144,22 +144,35 @@ Quad padDigitGlyph(int n, bool mode1) {
 
 // ---- glyph recognition
 
-// Which image of `group` is drawn in `quad`: the one whose ink (alpha >= 128, nearest texel)
-// best overlaps the dark pixels read back there (intersection over union).
+// Which image of `group` (all of one size) is drawn in `quad`: the one whose ink (alpha >= 128,
+// nearest texel) best overlaps the dark pixels read back there (intersection over union).
 int recognise(const Shot& shot, const ImageGroup& group, const Quad& quad, double* bestScore = nullptr) {
+  const int x0 = std::max(0, static_cast<int>(std::ceil(quad.cx - quad.hx)));
+  const int x1 = std::min(shot.w, static_cast<int>(quad.cx + quad.hx));
+  const int y0 = std::max(0, static_cast<int>(std::ceil(quad.cy - quad.hy)));
+  const int y1 = std::min(shot.h, static_cast<int>(quad.cy + quad.hy));
+  if (x1 <= x0 || y1 <= y0) return -1;
+  // Dark pixels seen, and for each of them the texel every candidate shows there.
+  std::vector<bool> seen;
+  std::vector<std::size_t> texelOffset;
+  const TextureImage& first = group[0];
+  for (int y = y0; y < y1; ++y)
+    for (int x = x0; x < x1; ++x) {
+      seen.push_back(shot.at(x, y).luma() < 110);
+      const double s = (x + 0.5 - (quad.cx - quad.hx)) / (2 * quad.hx), t = (y + 0.5 - (quad.cy - quad.hy)) / (2 * quad.hy);
+      const int tx = std::min(first.width - 1, std::max(0, static_cast<int>(s * first.width)));
+      const int ty = std::min(first.height - 1, std::max(0, static_cast<int>(t * first.height)));
+      texelOffset.push_back((static_cast<std::size_t>(ty) * first.width + tx) * 4 + 3);
+    }
   int best = -1;
   double bestIou = -1;
-  const int x0 = static_cast<int>(std::ceil(quad.cx - quad.hx)), x1 = static_cast<int>(quad.cx + quad.hx);
-  const int y0 = static_cast<int>(std::ceil(quad.cy - quad.hy)), y1 = static_cast<int>(quad.cy + quad.hy);
   for (int g = 0; g < group.count; ++g) {
     int both = 0, either = 0;
-    for (int y = std::max(0, y0); y < std::min(shot.h, y1); ++y)
-      for (int x = std::max(0, x0); x < std::min(shot.w, x1); ++x) {
-        const bool seen = shot.at(x, y).luma() < 110;
-        const bool ink = quad.texelAt(group[g], x + 0.5, y + 0.5).a >= 128;
-        both += seen && ink;
-        either += seen || ink;
-      }
+    for (std::size_t k = 0; k < seen.size(); ++k) {
+      const bool ink = group[g].pixels[texelOffset[k]] >= 128;
+      both += seen[k] && ink;
+      either += seen[k] || ink;
+    }
     const double iou = either ? static_cast<double>(both) / either : 0;
     if (iou > bestIou) {
       bestIou = iou;
@@ -710,8 +723,8 @@ TEST(MainSurface, OutOfRangeTouchStateIsHarmless) {
   Keyboard kb("render-odd", {1});
   REQUIRE_GL(kb);
   PopUps pops(kb);
-  const std::uint32_t columns[] = {8, 9, 10, 26, 0xFFFFFFFFu};
-  const std::uint32_t rows[] = {0, 1, 2, 3, 7, 0xFFFFFFFFu};
+  const std::uint32_t columns[] = {8, 10, 26, 0xFFFFFFFFu};
+  const std::uint32_t rows[] = {0, 2, 3, 0xFFFFFFFFu};
   for (std::uint32_t type : {0u, 1u, 2u, 9u})
     for (std::uint32_t row : rows)
       for (std::uint32_t column : columns) {
@@ -720,9 +733,12 @@ TEST(MainSurface, OutOfRangeTouchStateIsHarmless) {
         kb.s->touchColumn = column;
         kb.s->anyKeyReleased = 0;
         kb.s->keyReleased[3] = 0;
-        kb.draw();
-        pops.drawField();
-        pops.drawTop();
+        kb.gl.makeCurrent();
+        mainDrawFrame(*kb.s);
+        pops.field.makeCurrent();
+        popDrawFrame(*kb.s, true);
+        pops.top.makeCurrent();
+        popTopDrawFrame(*kb.s);
       }
   kb.gl.makeCurrent();
   EXPECT_EQ(glGetError(), static_cast<GLenum>(GL_NO_ERROR));

@@ -1,0 +1,140 @@
+// One keyboard frame on Mesa's llvmpipe (GLES 1.1, offscreen 1080 x 720): frames per second
+// including glFinish, set against the library's own CPU time per frame.
+//
+// To tell the library's cost apart from the driver's, this program interposes the GL entry
+// points a frame uses: the library (linked statically) calls these definitions, which count
+// the call and forward it to the real driver (dlsym RTLD_NEXT), or, in the "null driver"
+// pass, return at once. The null pass is then exactly the library's own work per frame (matrix
+// chains, state reads, conditions, plus one call per GL entry point), and the call count says
+// how much it asks of the driver.
+//
+//   cmake -S . -B build-bench -G Ninja -DTESSEL_BUILD_BENCH=ON
+//   cmake --build build-bench --target render_bench && build-bench/bench/render_bench
+#include <benchmark/benchmark.h>
+
+#include <GLES/gl.h>
+#include <dlfcn.h>
+#include <time.h>
+
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <string>
+
+#include "render/surfaces.h"
+#include "session/session.h"
+#include "support/egl_context.h"
+
+namespace {
+
+bool gNullDriver = false;
+long gCalls = 0;
+
+template <typename F>
+F real(const char* name) {
+  static_assert(sizeof(F) == sizeof(void*), "function pointer");
+  void* p = dlsym(RTLD_NEXT, name);
+  if (p == nullptr) {
+    std::fprintf(stderr, "render_bench: no %s in the GL library\n", name);
+    std::abort();
+  }
+  F f;
+  std::memcpy(&f, &p, sizeof f);
+  return f;
+}
+
+}  // namespace
+
+// The per-frame entry points, interposed. Each forwards unless the null driver is on.
+#define TESSEL_FORWARD(name, params, args)                         \
+  extern "C" GL_API void GL_APIENTRY name params {                 \
+    static const auto next = real<void(GL_APIENTRY*) params>(#name); \
+    ++gCalls;                                                      \
+    if (!gNullDriver) next args;                                   \
+  }
+
+TESSEL_FORWARD(glTexEnvx, (GLenum a, GLenum b, GLfixed c), (a, b, c))
+TESSEL_FORWARD(glClearColor, (GLfloat a, GLfloat b, GLfloat c, GLfloat d), (a, b, c, d))
+TESSEL_FORWARD(glClear, (GLbitfield a), (a))
+TESSEL_FORWARD(glLoadIdentity, (void), ())
+TESSEL_FORWARD(glMatrixMode, (GLenum a), (a))
+TESSEL_FORWARD(glTranslatef, (GLfloat a, GLfloat b, GLfloat c), (a, b, c))
+TESSEL_FORWARD(glScalef, (GLfloat a, GLfloat b, GLfloat c), (a, b, c))
+TESSEL_FORWARD(glBindTexture, (GLenum a, GLuint b), (a, b))
+TESSEL_FORWARD(glTexCoordPointer, (GLint a, GLenum b, GLsizei c, const void* d), (a, b, c, d))
+TESSEL_FORWARD(glVertexPointer, (GLint a, GLenum b, GLsizei c, const void* d), (a, b, c, d))
+TESSEL_FORWARD(glDrawArrays, (GLenum a, GLint b, GLsizei c), (a, b, c))
+TESSEL_FORWARD(glEnable, (GLenum a), (a))
+TESSEL_FORWARD(glDisable, (GLenum a), (a))
+TESSEL_FORWARD(glBlendFunc, (GLenum a, GLenum b), (a, b))
+
+namespace {
+
+using tessel::KeyboardSession;
+
+double threadSeconds() {
+  timespec ts{};
+  clock_gettime(CLOCK_THREAD_CPUTIME_ID, &ts);
+  return static_cast<double>(ts.tv_sec) + ts.tv_nsec * 1e-9;
+}
+
+// A keyboard session on its own offscreen surface. `scene` 0: letters with a held key and its
+// balloon (the busiest letter frame); 1: the number pad with a held digit.
+struct Scene {
+  explicit Scene(int scene) : gl(1080, 720) {
+    handle = tessel::createSession(("bench-" + std::to_string(scene)).c_str());
+    s = tessel::sessionAt(handle);
+    if (s == nullptr || !gl.ok()) return;
+    tessel::mainSurfaceCreated(*s);
+    tessel::mainSurfaceChanged(*s, 1080, 720, 1);
+    s->currentKbdType = scene == 0 ? 0 : 1;
+    s->anyKeyReleased = 0;
+    s->keyReleased[3] = 0;
+    s->touchRow = scene == 0 ? 2 : 1;
+    s->touchColumn = scene == 0 ? 3 : 1;
+  }
+  ~Scene() { tessel::destroySession(handle); }
+  tessel::test::GlesContext gl;
+  int handle = -1;
+  KeyboardSession* s = nullptr;
+};
+
+void BM_KeyboardFrame(benchmark::State& state) {
+  Scene scene(static_cast<int>(state.range(0)));
+  if (scene.s == nullptr) {
+    state.SkipWithError(("no offscreen GLES 1.1: " + scene.gl.error()).c_str());
+    return;
+  }
+  gNullDriver = false;
+  tessel::mainDrawFrame(*scene.s);  // warm-up: first use of each texture
+  glFinish();
+  double issue = 0;  // caller-thread CPU inside mainDrawFrame (library + driver front end)
+  for (auto _ : state) {
+    const double t0 = threadSeconds();
+    tessel::mainDrawFrame(*scene.s);
+    issue += threadSeconds() - t0;
+    glFinish();
+  }
+  const double frames = static_cast<double>(state.iterations());
+
+  // The same frame against the null driver: the library's own CPU time.
+  constexpr int kNullFrames = 20000;
+  gNullDriver = true;
+  gCalls = 0;
+  const double t0 = threadSeconds();
+  for (int k = 0; k < kNullFrames; ++k) tessel::mainDrawFrame(*scene.s);
+  const double own = (threadSeconds() - t0) / kNullFrames;
+  const double calls = static_cast<double>(gCalls) / kNullFrames;
+  gNullDriver = false;
+
+  state.counters["fps"] = benchmark::Counter(frames, benchmark::Counter::kIsRate);
+  state.counters["issue_us"] = issue / frames * 1e6;
+  state.counters["own_us"] = own * 1e6;
+  state.counters["gl_calls"] = calls;
+  state.counters["own_share_of_issue"] = own / (issue / frames);
+}
+BENCHMARK(BM_KeyboardFrame)->Arg(0)->Arg(1)->ArgName("pad")->Unit(benchmark::kMillisecond)->UseRealTime();
+
+}  // namespace
+
+BENCHMARK_MAIN();
