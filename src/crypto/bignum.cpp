@@ -279,6 +279,10 @@ struct Montgomery {
   L r2[maxLimbs<L>()] = {};    // R^2 mod n, R = 2^(bits(L) * n)
   L n0 = 0;                    // -mod^-1 mod 2^bits(L)
   typename RowKernel<L, W>::Fn row = RowKernel<L, W>::pick();
+  // Scratch for products and reductions. Kept in the context rather than on each call's stack
+  // so one wipe of the context at the end of an exponentiation clears every intermediate.
+  mutable L t[2 * maxLimbs<L>()] = {};
+  mutable L diff[maxLimbs<L>()] = {};
 
   // The value as limbs of type L (n of them; the value has fewer significant limbs).
   static void load(const BigNumber& v, L* out, int n) noexcept {
@@ -322,49 +326,45 @@ struct Montgomery {
 
   // out = a * b / R mod n, fully reduced; a, b < n. out may alias a or b.
   void multiply(const L* a, const L* b, L* out) const noexcept {
-    L t[2 * maxLimbs<L>()];
     for (int i = 0; i < n; ++i) t[i] = 0;
     for (int i = 0; i < n; ++i) t[i + n] = row(t + i, a, n, b[i]);
-    reduce(t, out);
+    reduce(out);
   }
 
   // out = a * a / R mod n; a < n. Each cross product a[i] * a[j] is formed once and doubled,
   // which saves nearly half of the multiplications of a general product.
   void square(const L* a, L* out) const noexcept {
     constexpr int bits = limbBits<L>();
-    L t[2 * maxLimbs<L>()];
     for (int i = 0; i < 2 * n; ++i) t[i] = 0;
     for (int i = 0; i + 1 < n; ++i) t[i + n] = row(t + 2 * i + 1, a + i + 1, n - i - 1, a[i]);
-    L shifted = 0;
-    for (int i = 0; i < 2 * n; ++i) {
-      const L v = t[i];
-      t[i] = static_cast<L>((v << 1) | shifted);
-      shifted = static_cast<L>(v >> (bits - 1));
-    }
-    L carry = 0;
+    // Double the cross products and add the squares a[i]^2 in one pass over t.
+    L shifted = 0, carry = 0;
     for (int i = 0; i < n; ++i) {
+      const L lo = t[2 * i], hi = t[2 * i + 1];
+      const L doubledLo = static_cast<L>((lo << 1) | shifted);
+      const L doubledHi = static_cast<L>((hi << 1) | (lo >> (bits - 1)));
+      shifted = static_cast<L>(hi >> (bits - 1));
       const W sq = static_cast<W>(a[i]) * a[i];
-      const W lo = static_cast<W>(t[2 * i]) + static_cast<L>(sq) + carry;
-      t[2 * i] = static_cast<L>(lo);
-      const W hi = static_cast<W>(t[2 * i + 1]) + static_cast<L>(sq >> bits) + static_cast<L>(lo >> bits);
-      t[2 * i + 1] = static_cast<L>(hi);
-      carry = static_cast<L>(hi >> bits);
+      const W sumLo = static_cast<W>(doubledLo) + static_cast<L>(sq) + carry;
+      t[2 * i] = static_cast<L>(sumLo);
+      const W sumHi = static_cast<W>(doubledHi) + static_cast<L>(sq >> bits) + static_cast<L>(sumLo >> bits);
+      t[2 * i + 1] = static_cast<L>(sumHi);
+      carry = static_cast<L>(sumHi >> bits);
     }
-    reduce(t, out);
+    reduce(out);
   }
 
   // out = a / R mod n: leaves the Montgomery domain with one reduction and no product.
   void leaveDomain(const L* a, L* out) const noexcept {
-    L t[2 * maxLimbs<L>()];
     for (int i = 0; i < n; ++i) t[i] = a[i];
     for (int i = n; i < 2 * n; ++i) t[i] = 0;
-    reduce(t, out);
+    reduce(out);
   }
 
  private:
-  // Montgomery reduction of the 2n-limb t (< n * R) to t / R mod n in out; wipes t.
+  // Montgomery reduction of the 2n-limb scratch t (< n * R) to t / R mod n in out.
   // Separate operand scanning: each row adds m * mod so that one more low limb becomes zero.
-  void reduce(L* t, L* out) const noexcept {
+  void reduce(L* out) const noexcept {
     constexpr int bits = limbBits<L>();
     L top = 0;  // the carry above limb 2n - 1 (0 or 1)
     for (int i = 0; i < n; ++i) {
@@ -377,7 +377,6 @@ struct Montgomery {
     // The result (top, t[n..2n)) is below 2n: subtract n once unless that borrows, chosen by
     // mask rather than by branch.
     const L* r = t + n;
-    L diff[maxLimbs<L>()];
     L borrow = 0;
     for (int j = 0; j < n; ++j) {
       const L x = r[j];
@@ -389,8 +388,6 @@ struct Montgomery {
     // Keep r when r < n, i.e. the subtraction borrowed out of the top limb too.
     const L keep = static_cast<L>(0 - static_cast<L>(borrow > top));
     for (int j = 0; j < n; ++j) out[j] = static_cast<L>((r[j] & keep) | (diff[j] & ~keep));
-    secureWipe(t, sizeof(L) * 2 * static_cast<std::size_t>(n));
-    secureWipe(diff, sizeof(L) * static_cast<std::size_t>(n));
   }
 };
 

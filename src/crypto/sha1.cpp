@@ -1,9 +1,18 @@
 // SHA-1 (FIPS 180-4): portable compression with the message schedule kept as a rolling
-// 16-word window, fully unrolled so the round functions and constants are fixed per step.
+// 16-word window, fully unrolled so the round functions and constants are fixed per step;
+// on x86-64 CPUs with the SHA extensions the blocks go through those instructions instead
+// (picked once from CPUID; sha1AllowHardware(false) forces the portable code for tests).
 // The context holds message-derived state: sha1() wipes its own, callers wipe theirs.
 #include "crypto/sha1.h"
 
+#include <atomic>
 #include <cstring>
+
+#if defined(__x86_64__) && (defined(__GNUC__) || defined(__clang__))
+#define TESSEL_HAVE_SHA_NI 1
+#include <cpuid.h>
+#include <immintrin.h>
+#endif
 
 #include "crypto/wipe.h"
 
@@ -34,7 +43,7 @@ inline void store32be(std::uint8_t* p, std::uint32_t v) {
     (b) = rol(b, 30);                     \
   } while (0)
 
-void compress(std::uint32_t state[5], const std::uint8_t* block, std::size_t blocks) noexcept {
+void compressPortable(std::uint32_t state[5], const std::uint8_t* block, std::size_t blocks) noexcept {
   std::uint32_t w[16];
   for (; blocks > 0; --blocks, block += 64) {
     std::uint32_t a = state[0], b = state[1], c = state[2], d = state[3], e = state[4];
@@ -73,7 +82,77 @@ void compress(std::uint32_t state[5], const std::uint8_t* block, std::size_t blo
   secureWipe(w, sizeof(w));
 }
 
+#if defined(TESSEL_HAVE_SHA_NI)
+// Four rounds per sha1rnds4; group g of the schedule (W[4g..4g+3]) lives in msg[g % 4], lane 3
+// holding the first word. sha1nexte derives the next group's E from the A of four rounds
+// earlier; sha1msg1/sha1msg2 extend the schedule (W[t-16] ^ W[t-14], then ^ W[t-8] by hand,
+// then W[t-3] and the rotation).
+template <int F>
+__attribute__((target("sha,sse4.1,ssse3"))) inline __m128i rounds4(__m128i abcd, __m128i e) {
+  return _mm_sha1rnds4_epu32(abcd, e, F);
+}
+
+__attribute__((target("sha,sse4.1,ssse3"))) void compressShaNi(std::uint32_t state[5],
+                                                               const std::uint8_t* block,
+                                                               std::size_t blocks) noexcept {
+  const __m128i reverseBytes = _mm_set_epi64x(0x0001020304050607LL, 0x08090a0b0c0d0e0fLL);
+  __m128i abcd = _mm_shuffle_epi32(_mm_loadu_si128(reinterpret_cast<const __m128i*>(state)), 0x1B);
+  __m128i e0 = _mm_set_epi32(static_cast<int>(state[4]), 0, 0, 0);
+  for (; blocks > 0; --blocks, block += 64) {
+    const __m128i abcdSaved = abcd, eSaved = e0;
+    __m128i msg[4];
+    __m128i previousAbcd = abcd;
+    for (int g = 0; g < 20; ++g) {
+      __m128i& w = msg[g & 3];
+      if (g < 4) {
+        w = _mm_shuffle_epi8(_mm_loadu_si128(reinterpret_cast<const __m128i*>(block + 16 * g)),
+                             reverseBytes);
+      } else {
+        w = _mm_sha1msg2_epu32(
+            _mm_xor_si128(_mm_sha1msg1_epu32(msg[g & 3], msg[(g + 1) & 3]), msg[(g + 2) & 3]),
+            msg[(g + 3) & 3]);
+      }
+      const __m128i e = g == 0 ? _mm_add_epi32(e0, w) : _mm_sha1nexte_epu32(previousAbcd, w);
+      previousAbcd = abcd;
+      switch (g / 5) {
+        case 0: abcd = rounds4<0>(abcd, e); break;
+        case 1: abcd = rounds4<1>(abcd, e); break;
+        case 2: abcd = rounds4<2>(abcd, e); break;
+        default: abcd = rounds4<3>(abcd, e); break;
+      }
+    }
+    e0 = _mm_sha1nexte_epu32(previousAbcd, eSaved);
+    abcd = _mm_add_epi32(abcd, abcdSaved);
+  }
+  _mm_storeu_si128(reinterpret_cast<__m128i*>(state), _mm_shuffle_epi32(abcd, 0x1B));
+  state[4] = static_cast<std::uint32_t>(_mm_extract_epi32(e0, 3));
+}
+
+bool cpuHasShaNi() noexcept {
+  unsigned a = 0, b = 0, c = 0, d = 0;
+  if (!__get_cpuid(1, &a, &b, &c, &d)) return false;
+  const bool ssse3 = (c & (1u << 9)) != 0, sse41 = (c & (1u << 19)) != 0;
+  if (!__get_cpuid_count(7, 0, &a, &b, &c, &d)) return false;
+  return ssse3 && sse41 && (b & (1u << 29)) != 0;
+}
+#endif
+
+std::atomic<bool> g_hardwareAllowed{true};
+
+void compress(std::uint32_t state[5], const std::uint8_t* block, std::size_t blocks) noexcept {
+#if defined(TESSEL_HAVE_SHA_NI)
+  static const bool available = cpuHasShaNi();
+  if (available && g_hardwareAllowed.load(std::memory_order_relaxed))
+    return compressShaNi(state, block, blocks);
+#endif
+  compressPortable(state, block, blocks);
+}
+
 }  // namespace
+
+void sha1AllowHardware(bool allowed) noexcept {
+  g_hardwareAllowed.store(allowed, std::memory_order_relaxed);
+}
 
 void sha1Init(Sha1Context& ctx) noexcept {
   ctx.state[0] = 0x67452301u;

@@ -18,4 +18,8 @@ void sha1Final(Sha1Context& ctx, std::uint8_t digest[20]) noexcept;
 // One-shot digest; the context is wiped before returning.
 void sha1(const void* data, std::size_t length, std::uint8_t digest[20]) noexcept;
 
+// On x86-64 CPUs with the SHA extensions the compression runs on them. Tests and benchmarks
+// pass false to force the portable code (the default is true), so both are checked there.
+void sha1AllowHardware(bool allowed) noexcept;
+
 }  // namespace tessel
