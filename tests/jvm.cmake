@@ -4,7 +4,6 @@
 #                   with GL surfaces on offscreen GLES 1.1 contexts (libtessel_egl_test.so) and
 #                   the outputs opened by the server-side tool (tessel_open);
 # plus the build-time check that the native entry points match the header javac -h writes.
-# The JVM suite is labelled nosan: a sanitized library cannot be loaded into an uninstrumented JVM.
 if(NOT TARGET TesselVIP OR NOT TARGET tessel_java)
   message(STATUS "libTesselVIP.so or the managed class is not built: JVM suites skipped")
   return()
@@ -56,5 +55,26 @@ add_test(NAME jvm_suite
           -Dtessel.tmp=${TESSEL_JVM_TMP}
           -cp "${TESSEL_JVM_TESTS_JAR}:${TESSEL_JAVA_JAR_FILE}"
           com.qn.tessel.test.JvmSuite)
-set_tests_properties(jvm_suite PROPERTIES TIMEOUT 300 LABELS nosan
+set_tests_properties(jvm_suite PROPERTIES TIMEOUT 300
   FAIL_REGULAR_EXPRESSION "WARNING in native method|FATAL ERROR in native method")
+
+# Under AddressSanitizer (GCC) the JVM gets the sanitizer runtime preloaded, so the suite checks
+# the JNI layer for memory errors too. The JVM handles SIGSEGV itself and keeps its heap until
+# exit, hence handle_segv=0 and no leak report (the C++ suites cover leaks). Other sanitizer
+# builds cannot load the library into an uninstrumented JVM: the suite is labelled nosan there.
+if(TESSEL_SANITIZE)
+  set(TESSEL_JVM_PRELOAD "")
+  if(TESSEL_SANITIZE MATCHES "address" AND NOT TESSEL_SANITIZE MATCHES "thread|memory"
+     AND CMAKE_CXX_COMPILER_ID STREQUAL "GNU")
+    execute_process(COMMAND ${CMAKE_CXX_COMPILER} -print-file-name=libasan.so
+                    OUTPUT_VARIABLE TESSEL_JVM_PRELOAD OUTPUT_STRIP_TRAILING_WHITESPACE)
+  endif()
+  if(TESSEL_JVM_PRELOAD AND EXISTS "${TESSEL_JVM_PRELOAD}")
+    set_property(TEST jvm_suite PROPERTY ENVIRONMENT
+      "LD_PRELOAD=${TESSEL_JVM_PRELOAD}"
+      "ASAN_OPTIONS=detect_leaks=0:handle_segv=0:allow_user_segv_handler=1:use_sigaltstack=0"
+      "UBSAN_OPTIONS=print_stacktrace=1")
+  else()
+    set_property(TEST jvm_suite PROPERTY LABELS nosan)
+  endif()
+endif()
