@@ -260,19 +260,21 @@ bool useAdx() noexcept {
 }
 #endif
 
-// The row kernel a Montgomery context uses, picked once per context.
+// The row kernel a Montgomery context uses, picked once per context. A flag rather than a
+// function pointer, so the chosen kernel is inlined into the product loops.
 template <typename L, typename W>
 struct RowKernel {
-  using Fn = L (*)(L*, const L*, int, L) noexcept;
-  static Fn pick() noexcept { return &mulAddRow<L, W>; }
+  static bool accelerated() noexcept { return false; }
+  static L run(bool, L* t, const L* a, int n, L b) noexcept { return mulAddRow<L, W>(t, a, n, b); }
 };
 
 #if defined(TESSEL_HAVE_ADX_KERNEL) && defined(__SIZEOF_INT128__)
 template <>
 struct RowKernel<std::uint64_t, unsigned __int128> {
-  using Fn = std::uint64_t (*)(std::uint64_t*, const std::uint64_t*, int, std::uint64_t) noexcept;
-  static Fn pick() noexcept {
-    return useAdx() ? &mulAddRowAdx : &mulAddRow<std::uint64_t, unsigned __int128>;
+  static bool accelerated() noexcept { return useAdx(); }
+  static std::uint64_t run(bool fast, std::uint64_t* t, const std::uint64_t* a, int n,
+                           std::uint64_t b) noexcept {
+    return fast ? mulAddRowAdx(t, a, n, b) : mulAddRow<std::uint64_t, unsigned __int128>(t, a, n, b);
   }
 };
 #endif
@@ -283,7 +285,7 @@ struct Montgomery {
   L mod[maxLimbs<L>()] = {};
   L r2[maxLimbs<L>()] = {};    // R^2 mod n, R = 2^(bits(L) * n)
   L n0 = 0;                    // -mod^-1 mod 2^bits(L)
-  typename RowKernel<L, W>::Fn row = RowKernel<L, W>::pick();
+  bool fast = RowKernel<L, W>::accelerated();
   // Scratch for products and reductions. Kept in the context rather than on each call's stack
   // so one wipe of the context at the end of an exponentiation clears every intermediate.
   mutable L t[2 * maxLimbs<L>()] = {};
@@ -367,6 +369,10 @@ struct Montgomery {
   }
 
  private:
+  L row(L* into, const L* a, int count, L b) const noexcept {
+    return RowKernel<L, W>::run(fast, into, a, count, b);
+  }
+
   // Montgomery reduction of the 2n-limb scratch t (< n * R) to t / R mod n in out.
   // Separate operand scanning: each row adds m * mod so that one more low limb becomes zero.
   void reduce(L* out) const noexcept {
