@@ -337,6 +337,8 @@ TEST_F(DispatchTypes, ChecksComeInTheirOrder) {
   const char* a = app_.c_str();
   const char* e = enc_.c_str();
   static const std::string k245(245, 'x'), k246(246, 'x'), k254(254, 'x'), k255(255, 'x');
+  // 1021 bits: k = 128, but a "Keyou" block starts with an ASCII digit (0x30 and up), above it.
+  static const std::string lowTopModulus = "1F" + std::string(254, 'F');
   struct Case {
     const char* name;
     int type;
@@ -377,6 +379,7 @@ TEST_F(DispatchTypes, ChecksComeInTheirOrder) {
       {"Keyou takes 254 bytes for 2048 bits", 29, a, e, k254.c_str(), kTimestamp, true, 0},
       {"Keyou refuses 255 bytes for 2048 bits", 29, a, e, k255.c_str(), kTimestamp, true, 13},
       {"not a modulus", 0, "XYZ", e, "pw", kTimestamp, true, 12},
+      {"RSA refuses a block above the modulus", 29, a, lowTopModulus.c_str(), "pw", kTimestamp, true, 7},
   };
   for (const Case& c : cases) {
     const Dispatched d = dispatch(c.type, c.app, c.enc, c.text, c.timestamp, c.result);
