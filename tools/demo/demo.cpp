@@ -1,33 +1,214 @@
-// The road of one password, as an app drives the library.
+// The road of one password, driven the way an app drives the library: a session is configured,
+// its three GL surfaces are created offscreen on OpenGL ES 1.1, a password is typed by touch on
+// the shuffled keyboard, and the outputs are opened again with the server-side tool, as the
+// bank's backend would. Frames of what the user sees are written as PNG files.
+//
+// Usage: tessel_demo [--out DIR]
+// Exits non-zero if any step fails or the backend's view disagrees with what was typed.
+#include <openssl/evp.h>
+
 #include <cstdio>
 #include <cstring>
+#include <ctime>
+#include <string>
+#include <sys/stat.h>
 
 #include "crypto/error_table.h"
+#include "crypto/measure.h"
+#include "crypto/moduli.h"
+#include "input/touch.h"
+#include "offscreen.h"
+#include "pattern/strength.h"
+#include "render/surfaces.h"
+#include "server/envelope.h"
+#include "session/output.h"
 #include "session/session.h"
+#include "session/settings.h"
+#include "typist.h"
 
 using namespace tessel;
 
-int main() {
-  std::printf("Tessel demo\n");
-  const int handle = createSession("login-password");
-  std::printf("1. createSession(\"login-password\") -> handle %d\n", handle);
-  KeyboardSession* session = sessionAt(handle);
-  if (session == nullptr) return 1;
-  {
-    // Stand-in for typing until the keyboard can be driven by touches.
-    ContentGuard guard(*session->content);
-    const char* typed = "s3cret!";
-    std::memcpy(guard.text(), typed, std::strlen(typed));
-    session->content->length = static_cast<std::uint16_t>(std::strlen(typed));
+namespace {
+
+// The demo's sample password. A real app never sees it: only the keyboard does.
+const char kPassword[] = "Tessel#2026";
+const char kSalt[] = "8f3a2c91d7";
+const int kKeyboardWidth = 1080, kKeyboardHeight = 720, kPopHeight = 180;
+
+int g_failures = 0;
+
+void step(const char* text) { std::printf("  %s\n", text); }
+
+void check(bool ok, const char* what) {
+  std::printf("  %s %s\n", ok ? "ok  " : "FAIL", what);
+  if (!ok) ++g_failures;
+}
+
+std::string md5Hex(const std::string& data) {
+  unsigned char digest[EVP_MAX_MD_SIZE];
+  unsigned int n = 0;
+  EVP_Digest(data.data(), data.size(), digest, &n, EVP_md5(), nullptr);
+  static const char digits[] = "0123456789abcdef";
+  std::string hex;
+  for (unsigned k = 0; k < n; ++k) {
+    hex += digits[digest[k] >> 4];
+    hex += digits[digest[k] & 15];
   }
-  std::printf("2. typed 7 characters; getNativeContentLen -> %d\n", contentLength(*session));
-  std::printf("3. the stored bytes are RC4-sealed: ");
-  for (int k = 0; k < contentLength(*session); ++k) std::printf("%02X", session->content->plaintext[k]);
-  std::printf(" (not the text)\n");
-  std::printf("4. createSession(\"login-password\") again -> handle %d (same session)\n",
-              createSession("login-password"));
-  std::printf("5. error 7 reads \"%s\"; code 100 reads \"%s\"\n", errorMessage(7), lastErrorText(100));
+  return hex;
+}
+
+std::string sourcePath(const char* relative) { return std::string(TESSEL_SOURCE_DIR) + "/" + relative; }
+
+// The three surfaces an app would host, and the frames they make.
+struct Screen {
+  demo::OffscreenSurface topPop{kKeyboardWidth, kPopHeight};
+  demo::OffscreenSurface fieldPop{kKeyboardWidth, kPopHeight};
+  demo::OffscreenSurface keyboard{kKeyboardWidth, kKeyboardHeight};
+  std::string outDir;
+  int frame = 0;
+
+  bool ok() const { return topPop.ok() && fieldPop.ok() && keyboard.ok(); }
+
+  void create(KeyboardSession& s) {
+    keyboard.makeCurrent();
+    mainSurfaceCreated(s);
+    mainSurfaceChanged(s, kKeyboardWidth, kKeyboardHeight, 1);
+    fieldPop.makeCurrent();
+    popSurfaceCreated(s);
+    popSurfaceChanged(s, kKeyboardWidth, kPopHeight);
+    topPop.makeCurrent();
+    popTopSurfaceCreated(s);
+    popTopSurfaceChanged(s, kKeyboardWidth, kPopHeight);
+  }
+
+  // Draws all three surfaces and lays them out as an app does: the field pop-up right above the
+  // keyboard, and the transparent top pop-up over it, so the enlarged key lands in the balloon.
+  std::string snapshot(KeyboardSession& s) {
+    keyboard.makeCurrent();
+    mainDrawFrame(s);
+    fieldPop.makeCurrent();
+    popDrawFrame(s, true);
+    topPop.makeCurrent();
+    popTopDrawFrame(s);
+    demo::Canvas canvas(kKeyboardWidth, kKeyboardHeight + kPopHeight, 0x20242AFF);
+    canvas.paste(fieldPop.read(), kKeyboardWidth, kPopHeight, 0, 0);
+    canvas.paste(topPop.read(), kKeyboardWidth, kPopHeight, 0, 0);
+    canvas.paste(keyboard.read(), kKeyboardWidth, kKeyboardHeight, 0, kPopHeight);
+    char name[64];
+    std::snprintf(name, sizeof name, "/frame_%02d.png", frame++);
+    const std::string path = outDir + name;
+    if (!demo::writePng(path, canvas)) check(false, ("write " + path).c_str());
+    return path;
+  }
+};
+
+}  // namespace
+
+int main(int argc, char** argv) {
+  std::string outDir = "demo-frames";
+  for (int k = 1; k < argc; ++k) {
+    if (std::strcmp(argv[k], "--out") == 0 && k + 1 < argc) outDir = argv[++k];
+  }
+  mkdir(outDir.c_str(), 0755);
+
+  std::printf("Tessel demo: one password from the keyboard to the bank's backend\n\n");
+  std::printf("App side\n");
+  server::PrivateKey appKey, encKey;
+  std::string error;
+  if (!appKey.loadPemFile(sourcePath("tests/data/builtin_default_key.pem"), &error) ||
+      !encKey.loadPemFile(sourcePath("tools/demo/demo_encryption_key.pem"), &error)) {
+    std::printf("  FAIL loading the demo keys: %s\n", error.c_str());
+    return 1;
+  }
+  const int handle = createSession("demo-login-password");
+  KeyboardSession* s = sessionAt(handle);
+  if (s == nullptr) return 1;
+  std::printf("  createNativeSession(\"demo-login-password\") -> handle %d\n", handle);
+  setAccepts(*s, "[[:alnum:][:punct:]]{1,16}");
+  setMinLength(*s, 8);
+  setMaxLength(*s, 16);
+  setKbdRandom(*s, true);
+  setContentType(*s, 7);
+  setDictionaryFilter(*s, "12345678,password,qwertyui");
+  setHashRandom(*s, (std::string("1:") + kSalt).c_str());
+  setEncryPlat(*s, encKey.modulusHex().c_str(), false);
+  step("settings: accepts [[:alnum:][:punct:]]{1,16}, length 8..16, shuffled keys, digit+letter+symbol");
+  step("required, a dictionary of forbidden passwords, a hash salt, a 2048-bit encryption key");
+
+  Screen screen;
+  screen.outDir = outDir;
+  if (!screen.ok()) {
+    std::printf("  FAIL %s\n", screen.keyboard.error().c_str());
+    return 1;
+  }
+  screen.create(*s);
+  step("surfaces created on OpenGL ES 1.1 (offscreen): keyboard 1080x720, field and key pop-ups 1080x180");
+  std::printf("  the layout is shuffled: the top row reads ");
+  for (int k = 0; k < 10; ++k) std::printf("%c", static_cast<char>(s->letters[k] + s->keyMask));
+  std::printf("\n");
+
+  std::printf("\nUser side (%d characters, typed by touch; the demo reads the screen to find keys)\n",
+              static_cast<int>(std::strlen(kPassword)));
+  int taps = 0;
+  demo::Typist typist(*s, [&](const demo::Tap& tap) {
+    ++taps;
+    screen.snapshot(*s);
+    (void)tap;
+  });
+  bool typed = true;
+  for (const char* p = kPassword; *p; ++p) typed = typist.type(*p) && typed;
+  check(typed, "every character found on the keyboard (with one shift and a page switch)");
+  const int doneResult = typist.done();
+  screen.snapshot(*s);
+  std::printf("  %d taps (the last one on done), frames in %s/frame_00.png .. frame_%02d.png\n", taps,
+              outDir.c_str(), screen.frame - 1);
+  check(doneResult == 1, "done key released: setNativeTouchPos returned 1");
+
+  std::printf("\nApp side again (no plaintext crosses the boundary)\n");
+  const int length = contentLength(*s);
+  std::printf("  getNativeContentLen -> %d\n", length);
+  check(length == static_cast<int>(std::strlen(kPassword)), "length matches the characters typed");
+  const char degree = sessionDegree(*s);
+  std::printf("  getNativeDegree -> '%c' (E empty, W weak, M medium, S strong)\n", degree);
+  const int verify = sessionVerify(*s);
+  std::printf("  getNativeVerify -> %d (0 passes the rule)\n", verify);
+  SecureBuffer measure = computeMeasureValue(*s);
+  std::printf("  getNativeMeasureValue -> %s\n", measure ? measure.c_str() : "(none)");
+  check(measure && md5Hex(kPassword) == measure.c_str(), "measure value is the MD5 of the text");
+
+  char timestamp[32];
+  const std::time_t now = std::time(nullptr);
+  std::strftime(timestamp, sizeof timestamp, "%Y%m%d%H%M%S", std::gmtime(&now));
+  SecureBuffer content = contentOutput(*s, 48, timestamp);
+  std::printf("  getNativeContent(\"%s\") -> %zu base64 characters, last error \"%s\"\n", timestamp,
+              content ? content.size() : 0, lastErrorText(s->content->lastError));
+  SecureBuffer pinContent = contentOutput(*s, 47, timestamp);
+  std::printf("  getNativePinContent(\"%s\") -> %zu base64 characters, last error \"%s\"\n", timestamp,
+              pinContent ? pinContent.size() : 0, lastErrorText(s->content->lastError));
+
+  std::printf("\nBackend side (tools/server with the demo private keys)\n");
+  const std::string expected = server::saltedHashValue(kPassword, kSalt, 'S');
+  server::OpenKeys keys;
+  keys.app = &appKey;
+  keys.enc = &encKey;
+  server::Opened opened;
+  const bool openedContent = content && server::openOutput(48, content.c_str(), keys, &opened, &error);
+  check(openedContent, openedContent ? "content envelope opened with the built-in default key"
+                                     : ("content envelope: " + error).c_str());
+  if (openedContent) {
+    std::printf("  strength '%c', timestamp %s, salted value %s\n", opened.strength, opened.timestamp.c_str(),
+                opened.payload.c_str());
+    check(opened.payload == expected && opened.timestamp == timestamp,
+          "salted value = MD5(MD5(password) + salt)[8..24), computed by the backend from its own copy");
+  }
+  server::Opened openedPin;
+  const bool openedPinContent =
+      pinContent && server::openOutput(47, pinContent.c_str(), keys, &openedPin, &error);
+  check(openedPinContent && openedPin.contentOpened && openedPin.content == expected,
+        openedPinContent ? "PIN content: envelope and inner RSA payload opened, same salted value"
+                         : ("PIN content: " + error).c_str());
+
   destroySession(handle);
-  std::printf("6. destroyed; sessionAt(%d) is %s\n", handle, sessionAt(handle) ? "live" : "empty");
-  return 0;
+  std::printf("\n%s\n", g_failures == 0 ? "Demo finished: every check passed." : "Demo FAILED.");
+  return g_failures == 0 ? 0 : 1;
 }
