@@ -287,7 +287,7 @@ RepeatNode::RepeatNode(Node* child, std::int32_t minimum, std::int32_t extra, bo
       rtl_(rtl),
       bytes_(child->singleByte()) {}
 
-std::int32_t RepeatNode::scan(const MatchContext& c, std::int32_t limit) const noexcept {
+std::int32_t RepeatNode::scan(MatchContext& c, std::int32_t limit) const {
   const ByteSet& set = *bytes_;
   std::int32_t n = 0;
   if (!rtl_) {
@@ -297,6 +297,7 @@ std::int32_t RepeatNode::scan(const MatchContext& c, std::int32_t limit) const n
     const std::uint8_t* t = c.text + c.pos - 1;
     while (n < limit && set.has(t[-n])) ++n;
   }
+  c.chargeBytes(n);
   return n;
 }
 
@@ -617,6 +618,7 @@ bool BackrefNode::match(MatchContext& c) const {
   const std::int32_t from = std::min(a, b);
   const std::int32_t len = a < b ? b - a : a - b;
   if (len == 0) return true;
+  c.chargeBytes(len);
   if (!rtl_) {
     if (c.length - c.pos < len ||
         std::memcmp(c.text + c.pos, c.text + from, static_cast<std::size_t>(len)) != 0)

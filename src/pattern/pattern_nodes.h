@@ -168,7 +168,7 @@ class RepeatNode : public Node {
   bool greedyRun(MatchContext& c, std::int32_t count, bool extend) const;
   void dumpCounts(std::string& out, const char* kind) const;
   // Scans up to `limit` bytes of the child's set from the current position; the count.
-  std::int32_t scan(const MatchContext& c, std::int32_t limit) const noexcept;
+  std::int32_t scan(MatchContext& c, std::int32_t limit) const;
   std::int32_t available(const MatchContext& c) const noexcept {
     return rtl_ ? c.pos : c.length - c.pos;
   }
