@@ -1,0 +1,86 @@
+// Fuzzes the pattern engine (compile, whole-text match, dump) and the strength rating.
+//
+// Input: byte 0 compile flags (bit 0 extended, bit 1 right-to-left), byte 1 the rule set of
+// rateStrength (values above 90 pick the default rating), byte 2 the pattern length (at most
+// 128), then the pattern bytes, then the text (at most 512 bytes). The caps keep every run
+// short: the step budget bounds backtracking (the fuzzer sets a smaller one than the default,
+// see kFuzzStepBudget), and these sizes bound what one step costs.
+//
+// Checks: a tree exists exactly when the status says compiled; a match result has the
+// documented shape (1, N = group count, N + 1 ordered spans inside the text, group 0 the whole
+// text, -1 -1 for groups that took no part); matches() agrees with matchExact(); wholeMatch()
+// agrees with the engine for NUL-free patterns without flags (where the small budget sufficed);
+// no match runs past its budget, and one that exhausts it reports no match;
+// rateStrength returns one of the six letters.
+#include <cstddef>
+#include <cstdint>
+#include <cstring>
+#include <string>
+
+#include "fuzz_support.h"
+#include "pattern/match.h"
+#include "pattern/pattern_engine.h"
+#include "pattern/strength.h"
+
+namespace {
+
+constexpr std::size_t kMaxPattern = 128;
+constexpr std::size_t kMaxText = 512;
+// The default budget (kDefaultPatternStepBudget) takes seconds to run out under the sanitizers;
+// a smaller one exercises the same exhaustion path at a useful rate.
+constexpr std::int64_t kFuzzStepBudget = 100000;
+
+void checkResult(const tessel::MatchResult& r, const tessel::PatternEngine& engine, std::size_t length) {
+  if (r.empty()) return;
+  const auto n = static_cast<std::int32_t>(length);
+  FUZZ_CHECK(r[0] == 1);
+  FUZZ_CHECK(r[1] == engine.groupCount());
+  FUZZ_CHECK(r.size() == 2 + 2 * static_cast<std::size_t>(r[1] + 1));
+  FUZZ_CHECK(r[2] == 0 && r[3] == n);
+  for (std::size_t k = 4; k < r.size(); k += 2) {
+    const std::int32_t start = r[k], end = r[k + 1];
+    if (start == -1 && end == -1) continue;
+    FUZZ_CHECK(0 <= start && start <= end && end <= n);
+  }
+}
+
+}  // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+  if (size < 3) return 0;
+  const std::uint32_t flags = ((data[0] & 1) ? tessel::PatternEngine::kExtended : 0) |
+                              ((data[0] & 2) ? tessel::PatternEngine::kRightToLeft : 0);
+  const std::uint32_t ruleSet = data[1];
+  const std::size_t patternLength = data[2] < size - 3 ? data[2] : size - 3;
+  if (patternLength > kMaxPattern) return 0;
+  const std::string pattern(reinterpret_cast<const char*>(data + 3), patternLength);
+  const std::size_t textOffset = 3 + patternLength;
+  const std::size_t textLength = size - textOffset;
+  if (textLength > kMaxText) return 0;
+  const std::string text(reinterpret_cast<const char*>(data + textOffset), textLength);
+  const auto* bytes = reinterpret_cast<const std::uint8_t*>(text.data());
+
+  const tessel::PatternEngine engine(pattern.data(), pattern.size(), flags);
+  FUZZ_CHECK(engine.hasTree() == (engine.status() == tessel::PatternEngine::Status::kCompiled));
+  FUZZ_CHECK(!engine.dump().empty());
+
+  tessel::MatchContext context;
+  context.stepBudget = kFuzzStepBudget;
+  const tessel::MatchResult result = engine.matchExact(bytes, textLength, &context);
+  FUZZ_CHECK(context.stepsUsed() <= kFuzzStepBudget + 1);
+  const bool exhausted = context.stepsUsed() > kFuzzStepBudget;
+  if (!engine.hasTree() || exhausted) FUZZ_CHECK(result.empty());
+  checkResult(result, engine, textLength);
+
+  tessel::MatchContext second;
+  second.stepBudget = kFuzzStepBudget;
+  FUZZ_CHECK(engine.matches(bytes, textLength, &second) == !result.empty());
+
+  // wholeMatch runs with the default budget: compare only where the small one sufficed.
+  if (!exhausted && flags == 0 && std::memchr(pattern.data(), 0, pattern.size()) == nullptr) {
+    FUZZ_CHECK(tessel::wholeMatch(pattern.c_str(), bytes, textLength) == !result.empty());
+  }
+
+  FUZZ_CHECK(tessel_fuzz::isStrengthLetter(tessel::rateStrength(ruleSet, text.c_str())));
+  return 0;
+}
