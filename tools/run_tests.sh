@@ -19,3 +19,6 @@ cmake --build build-asan -j"$jobs"
 ASAN_OPTIONS=detect_leaks=1:strict_string_checks=1 UBSAN_OPTIONS=print_stacktrace=1 \
   LSAN_OPTIONS=suppressions="$PWD/tests/lsan.supp":print_suppressions=0 \
   ctest --test-dir build-asan --output-on-failure -j"$jobs" -LE nosan
+
+echo "== libFuzzer smoke run (clang, ASan+UBSan, about 12 s per target on fuzz/corpus)"
+bash tools/run_fuzz.sh smoke
