@@ -8,9 +8,11 @@ namespace tessel {
 void rc4Init(Rc4State& state, const std::uint8_t* key, std::size_t keyLength) noexcept {
   for (int k = 0; k < 256; ++k) state.s[k] = static_cast<std::uint8_t>(k);
   std::uint8_t j = 0;
+  std::size_t next = 0;  // k % keyLength without a division per byte
   for (int k = 0; k < 256; ++k) {
-    j = static_cast<std::uint8_t>(j + state.s[k] + key[k % keyLength]);
+    j = static_cast<std::uint8_t>(j + state.s[k] + key[next]);
     std::swap(state.s[k], state.s[j]);
+    if (++next == keyLength) next = 0;
   }
   state.i = 0;
   state.j = 0;
