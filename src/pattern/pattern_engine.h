@@ -90,6 +90,7 @@ class MatchContext {
   std::int32_t end = 0;         // where a whole match must finish
   std::int32_t lastStart = -1;
   std::int64_t stepsLeft = 0;
+  // Steps taken by the last match: at most stepBudget + 1, the +1 meaning "gave up".
   std::int64_t stepsUsed() const noexcept { return stepBudget - stepsLeft; }
 
   std::int32_t* stack = inlineStack_;
@@ -108,10 +109,14 @@ class MatchContext {
   void step() {
     if (--stepsLeft < 0) abort();
   }
-  // Charges a scan or comparison of `bytes` bytes: one step per 16 bytes.
+  // Charges a scan or comparison of `bytes` bytes: one step per 16 bytes. Like step(), it
+  // never takes stepsUsed() past stepBudget + 1.
   void chargeBytes(std::int32_t bytes) {
     stepsLeft -= bytes >> 4;
-    if (stepsLeft < 0) abort();
+    if (stepsLeft < 0) {
+      stepsLeft = -1;
+      abort();
+    }
   }
 
   // Prepares for one match; false when the capture array cannot be sized.
