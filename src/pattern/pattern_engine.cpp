@@ -62,7 +62,6 @@ bool MatchContext::reset(const std::uint8_t* t, std::int32_t n, int groups, bool
   start = rightToLeft ? n : 0;
   end = rightToLeft ? 0 : n;
   pos = start;
-  lastStart = -1;
   top = 0;
   stepsLeft = stepBudget;
   return true;
