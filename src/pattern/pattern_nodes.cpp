@@ -618,18 +618,11 @@ bool BackrefNode::match(MatchContext& c) const {
   const std::int32_t from = std::min(a, b);
   const std::int32_t len = a < b ? b - a : a - b;
   if (len == 0) return true;
-  c.chargeBytes(len);
-  if (!rtl_) {
-    if (c.length - c.pos < len ||
-        std::memcmp(c.text + c.pos, c.text + from, static_cast<std::size_t>(len)) != 0)
-      return false;
-    c.pos += len;
-    return true;
-  }
-  if (c.pos < len ||
-      std::memcmp(c.text + c.pos - len, c.text + from, static_cast<std::size_t>(len)) != 0)
-    return false;
-  c.pos -= len;
+  if (rtl_ ? c.pos < len : c.length - c.pos < len) return false;
+  c.chargeBytes(len);  // an upper bound: the comparison may stop sooner
+  const std::uint8_t* here = rtl_ ? c.text + c.pos - len : c.text + c.pos;
+  if (std::memcmp(here, c.text + from, static_cast<std::size_t>(len)) != 0) return false;
+  c.pos += rtl_ ? -len : len;
   return true;
 }
 
