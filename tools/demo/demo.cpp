@@ -3,13 +3,16 @@
 // the shuffled keyboard, and the outputs are opened again with the server-side tool, as the
 // bank's backend would. Frames of what the user sees are written as PNG files.
 //
-// Usage: tessel_demo [--out DIR]
+// With --window (when built with GLFW) the keyboard is shown in a window instead and typed by
+// hand with the mouse (window.h).
+//
+// Usage: tessel_demo [--out DIR] [--no-shuffle]
+//        tessel_demo --window [--no-shuffle] [--exit-after-done] [--screenshot PATH]
 // Exits non-zero if any step fails or the backend's view disagrees with what was typed.
 #include <openssl/evp.h>
 
 #include <cstdio>
 #include <cstring>
-#include <ctime>
 #include <string>
 #include <sys/stat.h>
 
@@ -20,29 +23,24 @@
 #include "offscreen.h"
 #include "pattern/strength.h"
 #include "render/surfaces.h"
+#include "road.h"
 #include "server/envelope.h"
 #include "session/output.h"
 #include "session/session.h"
-#include "session/settings.h"
 #include "typist.h"
+#if TESSEL_DEMO_WINDOW
+#include "window.h"
+#endif
 
 using namespace tessel;
+using demo::check;
+using demo::step;
 
 namespace {
 
 // The demo's sample password. A real app never sees it: only the keyboard does.
 const char kPassword[] = "Tessel#2026";
-const char kSalt[] = "8f3a2c91d7";
 const int kKeyboardWidth = 1080, kKeyboardHeight = 720, kPopHeight = 180;
-
-int g_failures = 0;
-
-void step(const char* text) { std::printf("  %s\n", text); }
-
-void check(bool ok, const char* what) {
-  std::printf("  %s %s\n", ok ? "ok  " : "FAIL", what);
-  if (!ok) ++g_failures;
-}
 
 std::string md5Hex(const std::string& data) {
   unsigned char digest[EVP_MAX_MD_SIZE];
@@ -56,8 +54,6 @@ std::string md5Hex(const std::string& data) {
   }
   return hex;
 }
-
-std::string sourcePath(const char* relative) { return std::string(TESSEL_SOURCE_DIR) + "/" + relative; }
 
 // The three surfaces an app would host, and the frames they make.
 struct Screen {
@@ -106,34 +102,58 @@ struct Screen {
 
 int main(int argc, char** argv) {
   std::string outDir = "demo-frames";
+  bool shuffle = true, window = false;
+#if TESSEL_DEMO_WINDOW
+  demo::WindowOptions windowOptions;
+#endif
   for (int k = 1; k < argc; ++k) {
-    if (std::strcmp(argv[k], "--out") == 0 && k + 1 < argc) outDir = argv[++k];
+    const std::string arg = argv[k];
+    if (arg == "--out" && k + 1 < argc) {
+      outDir = argv[++k];
+    } else if (arg == "--no-shuffle") {
+      shuffle = false;
+    } else if (arg == "--window") {
+      window = true;
+#if TESSEL_DEMO_WINDOW
+    } else if (arg == "--exit-after-done") {
+      windowOptions.exitAfterDone = true;
+    } else if (arg == "--screenshot" && k + 1 < argc) {
+      windowOptions.screenshot = argv[++k];
+#endif
+    } else {
+      std::fprintf(stderr,
+                   "usage: tessel_demo [--out DIR] [--no-shuffle]\n"
+                   "       tessel_demo --window [--no-shuffle] [--exit-after-done] [--screenshot PATH]\n");
+      return 2;
+    }
   }
-  mkdir(outDir.c_str(), 0755);
+#if !TESSEL_DEMO_WINDOW
+  if (window) {
+    std::fprintf(stderr, "tessel_demo: --window needs GLFW (libglfw3-dev) when the demo is configured\n");
+    return 2;
+  }
+#endif
+  if (!window) mkdir(outDir.c_str(), 0755);
 
-  std::printf("Tessel demo: one password from the keyboard to the bank's backend\n\n");
+  std::printf(window ? "Tessel demo: the keyboard in a window, typed by hand\n\n"
+                     : "Tessel demo: one password from the keyboard to the bank's backend\n\n");
   std::printf("App side\n");
-  server::PrivateKey appKey, encKey;
+  demo::BackendKeys backendKeys;
   std::string error;
-  if (!appKey.loadPemFile(sourcePath("tests/data/builtin_default_key.pem"), &error) ||
-      !encKey.loadPemFile(sourcePath("tools/demo/demo_encryption_key.pem"), &error)) {
+  if (!backendKeys.load(&error)) {
     std::printf("  FAIL loading the demo keys: %s\n", error.c_str());
     return 1;
   }
-  const int handle = createSession("demo-login-password");
+  const int handle = demo::createDemoSession(backendKeys.enc, shuffle);
   KeyboardSession* s = sessionAt(handle);
   if (s == nullptr) return 1;
-  std::printf("  createNativeSession(\"demo-login-password\") -> handle %d\n", handle);
-  setAccepts(*s, "[[:alnum:][:punct:]]{1,16}");
-  setMinLength(*s, 8);
-  setMaxLength(*s, 16);
-  setKbdRandom(*s, true);
-  setContentType(*s, 7);
-  setDictionaryFilter(*s, "12345678,password,qwertyui");
-  setHashRandom(*s, (std::string("1:") + kSalt).c_str());
-  setEncryPlat(*s, encKey.modulusHex().c_str(), false);
-  step("settings: accepts [[:alnum:][:punct:]]{1,16}, length 8..16, shuffled keys, digit+letter+symbol");
-  step("required, a dictionary of forbidden passwords, a hash salt, a 2048-bit encryption key");
+#if TESSEL_DEMO_WINDOW
+  if (window) {
+    const int status = demo::runWindow(*s, backendKeys.openKeys(), windowOptions);
+    destroySession(handle);
+    return status;
+  }
+#endif
 
   Screen screen;
   screen.outDir = outDir;
@@ -143,7 +163,7 @@ int main(int argc, char** argv) {
   }
   screen.create(*s);
   step("surfaces created on OpenGL ES 1.1 (offscreen): keyboard 1080x720, field and key pop-ups 1080x180");
-  std::printf("  the layout is shuffled: the top row reads ");
+  std::printf("  the layout is %s: the top row reads ", shuffle ? "shuffled" : "fixed");
   for (int k = 0; k < 10; ++k) std::printf("%c", static_cast<char>(s->letters[k] + s->keyMask));
   std::printf("\n");
 
@@ -176,31 +196,21 @@ int main(int argc, char** argv) {
   std::printf("  getNativeMeasureValue -> %s\n", measure ? measure.c_str() : "(none)");
   check(measure && md5Hex(kPassword) == measure.c_str(), "measure value is the MD5 of the text");
 
-  char timestamp[32];
-  const std::time_t now = std::time(nullptr);
-  std::strftime(timestamp, sizeof timestamp, "%Y%m%d%H%M%S", std::gmtime(&now));
-  SecureBuffer content = contentOutput(*s, 48, timestamp);
-  std::printf("  getNativeContent(\"%s\") -> %zu base64 characters, last error \"%s\"\n", timestamp,
+  const std::string timestamp = demo::utcTimestamp();
+  SecureBuffer content = contentOutput(*s, 48, timestamp.c_str());
+  std::printf("  getNativeContent(\"%s\") -> %zu base64 characters, last error \"%s\"\n", timestamp.c_str(),
               content ? content.size() : 0, lastErrorText(s->content->lastError));
-  SecureBuffer pinContent = contentOutput(*s, 47, timestamp);
-  std::printf("  getNativePinContent(\"%s\") -> %zu base64 characters, last error \"%s\"\n", timestamp,
+  SecureBuffer pinContent = contentOutput(*s, 47, timestamp.c_str());
+  std::printf("  getNativePinContent(\"%s\") -> %zu base64 characters, last error \"%s\"\n", timestamp.c_str(),
               pinContent ? pinContent.size() : 0, lastErrorText(s->content->lastError));
 
   std::printf("\nBackend side (tools/server with the demo private keys)\n");
-  const std::string expected = server::saltedHashValue(kPassword, kSalt, 'S');
-  server::OpenKeys keys;
-  keys.app = &appKey;
-  keys.enc = &encKey;
+  const std::string expected = server::saltedHashValue(kPassword, demo::kSalt, 'S');
+  const server::OpenKeys keys = backendKeys.openKeys();
   server::Opened opened;
-  const bool openedContent = content && server::openOutput(48, content.c_str(), keys, &opened, &error);
-  check(openedContent, openedContent ? "content envelope opened with the built-in default key"
-                                     : ("content envelope: " + error).c_str());
-  if (openedContent) {
-    std::printf("  strength '%c', timestamp %s, salted value %s\n", opened.strength, opened.timestamp.c_str(),
-                opened.payload.c_str());
+  if (demo::openContent(content, keys, &opened))
     check(opened.payload == expected && opened.timestamp == timestamp,
           "salted value = MD5(MD5(password) + salt)[8..24), computed by the backend from its own copy");
-  }
   server::Opened openedPin;
   const bool openedPinContent =
       pinContent && server::openOutput(47, pinContent.c_str(), keys, &openedPin, &error);
@@ -209,6 +219,7 @@ int main(int argc, char** argv) {
                          : ("PIN content: " + error).c_str());
 
   destroySession(handle);
-  std::printf("\n%s\n", g_failures == 0 ? "Demo finished: every check passed." : "Demo FAILED.");
-  return g_failures == 0 ? 0 : 1;
+  const bool passed = demo::failures() == 0;
+  std::printf("\n%s\n", passed ? "Demo finished: every check passed." : "Demo FAILED.");
+  return passed ? 0 : 1;
 }

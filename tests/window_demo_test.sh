@@ -1,0 +1,145 @@
+#!/usr/bin/env bash
+# The demo's window mode used as a person would: under Xvfb, xdotool clicks a password into the
+# keyboard window (fixed layout, --no-shuffle), with one drag from a neighbouring key, one typo
+# deleted with the delete key, a shift and a page switch, then clicks done. The demo must open
+# the content envelope with the server library and print strength 'S' and the salted value that
+# md5sum computes here from the same password and salt; the screenshot it writes must be a PNG
+# of the whole framebuffer with real content.
+#
+# Usage: window_demo_test.sh TESSEL_DEMO WINDOW_BUILT(0|1)
+# Prints "window_demo_test: skipped (...)" and exits 0 when GLFW, xvfb-run or xdotool is missing.
+set -euo pipefail
+
+skip() {
+  echo "window_demo_test: skipped ($1)"
+  exit 0
+}
+
+if [ "${1:-}" = "--inner" ]; then
+  demo="$2"
+  work="$3"
+  out="$work/out.txt"
+  shot="$work/shot.png"
+
+  "$demo" --window --no-shuffle --exit-after-done --screenshot "$shot" >"$out" 2>&1 &
+  pid=$!
+  stop_demo() { kill "$pid" 2>/dev/null || true; }
+  trap stop_demo EXIT
+
+  wid=$(timeout 15 xdotool search --sync --onlyvisible --name "Tessel keyboard demo" | head -n 1 || true)
+  if [ -z "$wid" ]; then
+    echo "FAIL: no demo window appeared"
+    cat "$out"
+    exit 1
+  fi
+  geometry=""
+  for _ in $(seq 100); do
+    geometry=$(grep -m 1 '^  window ' "$out" || true)
+    [ -n "$geometry" ] && break
+    sleep 0.1
+  done
+  # "  window 720x600 (framebuffer 720x600): field pop-up 720x120 on top, keyboard 720x480 below"
+  read -r win_w win_h fb_w fb_h pop_h kb_h < <(echo "$geometry" |
+    sed -E 's/.*window ([0-9]+)x([0-9]+) \(framebuffer ([0-9]+)x([0-9]+)\): field pop-up [0-9]+x([0-9]+) .*keyboard [0-9]+x([0-9]+).*/\1 \2 \3 \4 \5 \6/')
+  echo "window ${win_w}x${win_h}, framebuffer ${fb_w}x${fb_h}, pop-up ${pop_h} rows, keyboard ${kb_h} rows"
+
+  # Window coordinates of a point given in key widths and key heights on the keyboard surface
+  # (10 columns, 4 rows, below the pop-up region).
+  at() {
+    awk -v c="$1" -v r="$2" -v ww="$win_w" -v wh="$win_h" -v fw="$fb_w" -v fh="$fb_h" -v p="$pop_h" -v k="$kb_h" \
+      'BEGIN { printf "%d %d", c * fw / 10 * ww / fw, (p + r * k / 4) * wh / fh }'
+  }
+  tap() {
+    # shellcheck disable=SC2046
+    xdotool mousemove --window "$wid" $(at "$1" "$2") click 1
+    sleep 0.05
+  }
+  # Key centres of the fixed layout: row 0 "qwertyuiop" (and digits "1234567890" on the symbol
+  # page) at column + 0.5; row 1 "asdfghjkl" (symbols "`~!@#$%^&") at column + 0.8; row 2
+  # "zxcvbnm" at column + 2.0; shift 0.75 and delete 9.25 on row 2; page switch 1.25 and done
+  # 8.75 on row 3.
+  shift_key() { tap 0.75 2.5; }
+  shift_key                 # shift on
+  tap 4.5 0.5               # T
+  shift_key                 # shift off
+  # e, by a drag: pressed on w, moved over to e, released there
+  # shellcheck disable=SC2046
+  xdotool mousemove --window "$wid" $(at 1.5 0.5) mousedown 1
+  sleep 0.05
+  # shellcheck disable=SC2046
+  xdotool mousemove --window "$wid" $(at 2.1 0.55)
+  sleep 0.05
+  # shellcheck disable=SC2046
+  xdotool mousemove --window "$wid" $(at 2.5 0.5) mouseup 1
+  sleep 0.05
+  tap 1.8 1.5               # s
+  tap 1.8 1.5               # s
+  tap 2.5 0.5               # e
+  tap 3.0 2.5               # x (a typo)
+  tap 9.25 2.5              # delete
+  tap 8.8 1.5               # l
+  tap 1.25 3.5              # page switch to symbols
+  tap 4.8 1.5               # #
+  tap 1.5 0.5               # 2
+  tap 9.5 0.5               # 0
+  tap 1.5 0.5               # 2
+  tap 5.5 0.5               # 6
+  tap 8.75 3.5              # done
+
+  for _ in $(seq 200); do
+    kill -0 "$pid" 2>/dev/null || break
+    sleep 0.1
+  done
+  status=0
+  wait "$pid" || status=$?
+  trap - EXIT
+  cat "$out"
+
+  password='Tessel#2026'
+  salt='8f3a2c91d7'
+  first=$(printf '%s' "$password" | md5sum | cut -c1-32)
+  expected=$(printf '%s%s' "$first" "$salt" | md5sum | cut -c9-24)
+  failed=0
+  expect() {
+    if grep -qF -- "$1" "$out"; then
+      echo "ok   $2"
+    else
+      echo "FAIL $2 (no \"$1\" in the output)"
+      failed=1
+    fi
+  }
+  [ "$status" -eq 0 ] && echo "ok   demo exit status 0" || { echo "FAIL demo exit status $status"; failed=1; }
+  expect "getNativeContentLen -> 11" "11 characters typed"
+  expect "ok   content envelope opened with the built-in default key" "content envelope opened"
+  expect "strength 'S'," "strength letter S"
+  expect "salted value $expected" "salted value MD5(MD5(password) + salt)[8..24) = $expected"
+  expect "ok   screenshot $shot" "screenshot written"
+
+  if [ -f "$shot" ]; then
+    size=$(stat -c %s "$shot")
+    signature=$(od -A n -t x1 -N 8 "$shot" | tr -d ' \n')
+    width=$((16#$(od -A n -t x1 -j 16 -N 4 "$shot" | tr -d ' \n')))
+    height=$((16#$(od -A n -t x1 -j 20 -N 4 "$shot" | tr -d ' \n')))
+    # A flat image of this size compresses to a few kilobytes; the keyboard's art does not.
+    if [ "$signature" = 89504e470d0a1a0a ] && [ "$width" -eq "$fb_w" ] && [ "$height" -eq "$fb_h" ] &&
+       [ "$size" -gt 30000 ]; then
+      echo "ok   screenshot is a ${width}x${height} PNG of $size bytes"
+    else
+      echo "FAIL screenshot: signature $signature, ${width}x${height}, $size bytes"
+      failed=1
+    fi
+  else
+    echo "FAIL no screenshot at $shot"
+    failed=1
+  fi
+  exit "$failed"
+fi
+
+demo="${1:?usage: window_demo_test.sh TESSEL_DEMO WINDOW_BUILT}"
+[ "${2:-1}" = 1 ] || skip "tessel_demo was built without GLFW, so without --window"
+for tool in xvfb-run Xvfb xauth xdotool; do
+  command -v "$tool" >/dev/null 2>&1 || skip "$tool is not installed"
+done
+work=$(mktemp -d)
+trap 'rm -rf "$work"' EXIT
+timeout 60 xvfb-run -a -s "-screen 0 1280x1024x24" bash "$0" --inner "$demo" "$work"
