@@ -1,0 +1,505 @@
+// Secret hygiene: a password typed through touches must never be left readable in freed heap
+// memory, in plain, hex or salted-hash form, by typing, any output operation or destroy; and
+// between operations the content buffer must hold only the sealed bytes.
+//
+// This executable replaces the allocator (malloc/free/calloc/realloc/the aligned forms and every
+// operator new/delete) with thin wrappers over glibc's __libc_* entry points. While a scan is
+// armed, free() looks through the whole usable size of the block for a fixed set of needles
+// before handing it back, and records every hit with its backtrace. The needles and the
+// password live in static arrays, and the test itself never copies them to the heap (the typist
+// gets one-character strings, which stay in the std::string's inline buffer).
+//
+// A sanitizer owns malloc, so under ASan/TSan the wrappers are compiled out and the tests skip;
+// CTest labels this suite nosan (tests/hygiene.cmake).
+#include <gtest/gtest.h>
+#include <openssl/evp.h>
+
+#include <execinfo.h>
+#include <malloc.h>
+
+#include <atomic>
+#include <cerrno>
+#include <cstdint>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <functional>
+#include <new>
+#include <string>
+#include <vector>
+
+#include "crypto/error_table.h"
+#include "crypto/measure.h"
+#include "input/layout.h"
+#include "pattern/strength.h"
+#include "session/output.h"
+#include "session/session.h"
+#include "session/settings.h"
+#include "support/dispatch_oracle.h"
+#include "support/keyboard_typist.h"
+
+#if defined(__SANITIZE_ADDRESS__) || defined(__SANITIZE_THREAD__)
+#define TESSEL_HYGIENE_SANITIZED 1
+#elif defined(__has_feature)
+#if __has_feature(address_sanitizer) || __has_feature(thread_sanitizer) || __has_feature(memory_sanitizer)
+#define TESSEL_HYGIENE_SANITIZED 1
+#endif
+#endif
+
+namespace {
+
+// ---- needles: static storage only
+
+constexpr std::size_t kMaxNeedle = 64;
+struct Needle {
+  const char* what;
+  unsigned char bytes[kMaxNeedle];
+  std::size_t size;
+};
+Needle g_needles[12];
+std::atomic<int> g_needleCount{0};
+
+// ---- hits recorded by free()
+
+constexpr int kMaxHits = 16;
+constexpr int kMaxFrames = 32;
+struct Hit {
+  int needle;
+  std::size_t blockSize;
+  int depth;
+  void* frames[kMaxFrames];
+};
+Hit g_hits[kMaxHits];
+std::atomic<int> g_hitCount{0};
+std::atomic<bool> g_armed{false};
+std::atomic<long> g_scannedBlocks{0};
+thread_local bool t_inScan = false;
+
+[[maybe_unused]] void scanFreedBlock(void* p) noexcept {
+  if (p == nullptr || !g_armed.load(std::memory_order_relaxed) || t_inScan) return;
+  t_inScan = true;
+  const std::size_t size = malloc_usable_size(p);
+  g_scannedBlocks.fetch_add(1, std::memory_order_relaxed);
+  const int needles = g_needleCount.load(std::memory_order_relaxed);
+  for (int i = 0; i < needles; ++i) {
+    if (memmem(p, size, g_needles[i].bytes, g_needles[i].size) == nullptr) continue;
+    const int slot = g_hitCount.fetch_add(1);
+    if (slot < kMaxHits) {
+      g_hits[slot].needle = i;
+      g_hits[slot].blockSize = size;
+      g_hits[slot].depth = backtrace(g_hits[slot].frames, kMaxFrames);
+    }
+  }
+  t_inScan = false;
+}
+
+}  // namespace
+
+#ifndef TESSEL_HYGIENE_SANITIZED
+// ---- the allocator wrappers
+
+extern "C" {
+void* __libc_malloc(std::size_t size);
+void __libc_free(void* p);
+void* __libc_calloc(std::size_t count, std::size_t size);
+void* __libc_realloc(void* p, std::size_t size);
+void* __libc_memalign(std::size_t alignment, std::size_t size);
+void* __libc_valloc(std::size_t size);
+void* __libc_pvalloc(std::size_t size);
+
+// glibc declares these noexcept (__THROW) in C++; the definitions must match.
+void* malloc(std::size_t size) noexcept { return __libc_malloc(size); }
+void* calloc(std::size_t count, std::size_t size) noexcept { return __libc_calloc(count, size); }
+void free(void* p) noexcept {
+  scanFreedBlock(p);
+  __libc_free(p);
+}
+// Moving reallocations go through free() so the old block is scanned like any other.
+void* realloc(void* p, std::size_t size) noexcept {
+  if (p == nullptr) return __libc_malloc(size);
+  if (!g_armed.load(std::memory_order_relaxed)) return __libc_realloc(p, size);
+  if (size == 0) {
+    free(p);
+    return nullptr;
+  }
+  const std::size_t old = malloc_usable_size(p);
+  if (size <= old) return p;
+  void* moved = __libc_malloc(size);
+  if (moved == nullptr) return nullptr;
+  std::memcpy(moved, p, old);
+  free(p);
+  return moved;
+}
+void* reallocarray(void* p, std::size_t count, std::size_t size) noexcept {
+  std::size_t total;
+  if (__builtin_mul_overflow(count, size, &total)) {
+    errno = ENOMEM;
+    return nullptr;
+  }
+  return realloc(p, total);
+}
+void* memalign(std::size_t alignment, std::size_t size) noexcept { return __libc_memalign(alignment, size); }
+void* aligned_alloc(std::size_t alignment, std::size_t size) noexcept { return __libc_memalign(alignment, size); }
+int posix_memalign(void** out, std::size_t alignment, std::size_t size) noexcept {
+  if (alignment < sizeof(void*) || (alignment & (alignment - 1)) != 0) return EINVAL;
+  void* p = __libc_memalign(alignment, size);
+  if (p == nullptr) return ENOMEM;
+  *out = p;
+  return 0;
+}
+void* valloc(std::size_t size) noexcept { return __libc_valloc(size); }
+void* pvalloc(std::size_t size) noexcept { return __libc_pvalloc(size); }
+}  // extern "C"
+
+namespace {
+void* newOrThrow(std::size_t size) {
+  void* p = malloc(size == 0 ? 1 : size);
+  if (p == nullptr) throw std::bad_alloc();
+  return p;
+}
+void* newAlignedOrThrow(std::size_t size, std::align_val_t alignment) {
+  void* p = __libc_memalign(static_cast<std::size_t>(alignment), size == 0 ? 1 : size);
+  if (p == nullptr) throw std::bad_alloc();
+  return p;
+}
+}  // namespace
+
+void* operator new(std::size_t size) { return newOrThrow(size); }
+void* operator new[](std::size_t size) { return newOrThrow(size); }
+void* operator new(std::size_t size, const std::nothrow_t&) noexcept { return malloc(size == 0 ? 1 : size); }
+void* operator new[](std::size_t size, const std::nothrow_t&) noexcept { return malloc(size == 0 ? 1 : size); }
+void* operator new(std::size_t size, std::align_val_t a) { return newAlignedOrThrow(size, a); }
+void* operator new[](std::size_t size, std::align_val_t a) { return newAlignedOrThrow(size, a); }
+void* operator new(std::size_t size, std::align_val_t a, const std::nothrow_t&) noexcept {
+  return __libc_memalign(static_cast<std::size_t>(a), size == 0 ? 1 : size);
+}
+void* operator new[](std::size_t size, std::align_val_t a, const std::nothrow_t&) noexcept {
+  return __libc_memalign(static_cast<std::size_t>(a), size == 0 ? 1 : size);
+}
+void operator delete(void* p) noexcept { free(p); }
+void operator delete[](void* p) noexcept { free(p); }
+void operator delete(void* p, std::size_t) noexcept { free(p); }
+void operator delete[](void* p, std::size_t) noexcept { free(p); }
+void operator delete(void* p, const std::nothrow_t&) noexcept { free(p); }
+void operator delete[](void* p, const std::nothrow_t&) noexcept { free(p); }
+void operator delete(void* p, std::align_val_t) noexcept { free(p); }
+void operator delete[](void* p, std::align_val_t) noexcept { free(p); }
+void operator delete(void* p, std::size_t, std::align_val_t) noexcept { free(p); }
+void operator delete[](void* p, std::size_t, std::align_val_t) noexcept { free(p); }
+void operator delete(void* p, std::align_val_t, const std::nothrow_t&) noexcept { free(p); }
+void operator delete[](void* p, std::align_val_t, const std::nothrow_t&) noexcept { free(p); }
+#endif  // TESSEL_HYGIENE_SANITIZED
+
+namespace tessel::test {
+namespace {
+
+// Typeable on the standard layout: both letter cases, digits and both symbol pages.
+constexpr char kPassword[] = "Qz7#Vx!k9Lm2&Pw";
+constexpr std::size_t kPasswordLength = sizeof kPassword - 1;
+constexpr char kSalt[] = "NaCl-4711";
+constexpr char kHashRandomS[] = "1:NaCl-4711";  // suffix "::::::::::NaCl-4711::::::::::S"
+constexpr char kHashRandomF[] = "2:NaCl-4711";  // ... "F"
+constexpr int kWidth = 1080, kHeight = 720;
+
+// Static copies of what the tests compare results with.
+char g_md5Hex[33];
+
+void lowerHex(const unsigned char* in, std::size_t n, char* out) {
+  static const char kDigits[] = "0123456789abcdef";
+  for (std::size_t i = 0; i < n; ++i) {
+    out[2 * i] = kDigits[in[i] >> 4];
+    out[2 * i + 1] = kDigits[in[i] & 15];
+  }
+}
+
+void upperHex(const unsigned char* in, std::size_t n, unsigned char* out) {
+  static const char kDigits[] = "0123456789ABCDEF";
+  for (std::size_t i = 0; i < n; ++i) {
+    out[2 * i] = static_cast<unsigned char>(kDigits[in[i] >> 4]);
+    out[2 * i + 1] = static_cast<unsigned char>(kDigits[in[i] & 15]);
+  }
+}
+
+void addNeedle(const char* what, const void* bytes, std::size_t size) {
+  const int i = g_needleCount.load();
+  ASSERT_LT(i, static_cast<int>(sizeof g_needles / sizeof g_needles[0]));
+  ASSERT_LE(size, kMaxNeedle);
+  g_needles[i].what = what;
+  std::memcpy(g_needles[i].bytes, bytes, size);
+  g_needles[i].size = size;
+  g_needleCount.store(i + 1);
+}
+
+// OpenSSL's MD5 (the independent oracle); called only while no scan is armed.
+void opensslMd5(const void* data, std::size_t n, unsigned char out[16]) {
+  unsigned int len = 0;
+  ASSERT_EQ(EVP_Digest(data, n, out, &len, EVP_md5(), nullptr), 1);
+  ASSERT_EQ(len, 16u);
+}
+
+// The needles: a prefix of the password (catches partial copies made while typing too), its
+// upper-case hex form (what a hex-encoded padded block would show), MD5(password) binary and
+// hex, and the salted value MD5(md5hex || salt): binary, the 16 hex digits every mode keeps,
+// and their upper-case hex form.
+void buildNeedles() {
+  g_needleCount.store(0);
+  addNeedle("password (first 8 characters)", kPassword, 8);
+  unsigned char hex[kMaxNeedle];
+  upperHex(reinterpret_cast<const unsigned char*>(kPassword), 8, hex);
+  addNeedle("password as upper-case hex", hex, 16);
+
+  unsigned char md5[16];
+  opensslMd5(kPassword, kPasswordLength, md5);
+  addNeedle("MD5(password), binary", md5, 16);
+  lowerHex(md5, 16, g_md5Hex);
+  g_md5Hex[32] = 0;
+  addNeedle("MD5(password), lower-case hex", g_md5Hex, 32);
+
+  char salted[32 + sizeof kSalt];
+  std::memcpy(salted, g_md5Hex, 32);
+  std::memcpy(salted + 32, kSalt, sizeof kSalt - 1);
+  unsigned char md5Salted[16];
+  opensslMd5(salted, 32 + sizeof kSalt - 1, md5Salted);
+  addNeedle("MD5(md5hex || salt), binary", md5Salted, 16);
+  char saltedHex[32];
+  lowerHex(md5Salted, 16, saltedHex);
+  addNeedle("MD5(md5hex || salt), hex digits 8..24", saltedHex + 8, 16);
+  upperHex(reinterpret_cast<const unsigned char*>(saltedHex + 8), 16, hex);
+  addNeedle("MD5(md5hex || salt), digits 8..24 as upper-case hex", hex, 32);
+}
+
+// Arms the free() scan for the lifetime of the object; reports every hit on disarm.
+class ScanScope {
+ public:
+  explicit ScanScope(const char* what) : what_(what), scannedBefore_(g_scannedBlocks.load()) {
+    g_hitCount.store(0);
+    g_armed.store(true);
+  }
+  // Blocks freed (and scanned) so far inside this scope.
+  long scanned() const { return g_scannedBlocks.load() - scannedBefore_; }
+  ~ScanScope() { disarmAndReport(); }
+  void disarmAndReport() {
+    if (!g_armed.exchange(false)) return;
+    const int hits = g_hitCount.load();
+    for (int i = 0; i < hits && i < kMaxHits; ++i) {
+      const Hit& h = g_hits[i];
+      std::string where;
+      char** symbols = backtrace_symbols(h.frames, h.depth);
+      for (int f = 2; f < h.depth && symbols != nullptr; ++f) where += std::string("\n    ") + symbols[f];
+      std::free(symbols);
+      ADD_FAILURE() << what_ << ": a freed heap block of " << h.blockSize << " bytes still held "
+                    << g_needles[h.needle].what << "; freed at (addr2line -Cfe <test> <+offset>):" << where;
+    }
+  }
+
+ private:
+  const char* what_;
+  long scannedBefore_;
+};
+
+// RC4 under the seal key, written out here rather than taken from the library.
+void sealKeystream(unsigned char* out, std::size_t n) {
+  static const unsigned char kKey[] = "QN-Tesselate";
+  unsigned char s[256];
+  for (int i = 0; i < 256; ++i) s[i] = static_cast<unsigned char>(i);
+  for (int i = 0, j = 0; i < 256; ++i) {
+    j = (j + s[i] + kKey[i % 12]) & 255;
+    std::swap(s[i], s[j]);
+  }
+  for (std::size_t k = 0, i = 0, j = 0; k < n; ++k) {
+    i = (i + 1) & 255;
+    j = (j + s[i]) & 255;
+    std::swap(s[i], s[j]);
+    out[k] = s[(s[i] + s[j]) & 255];
+  }
+}
+
+// Between operations: exactly `length` sealed bytes (RC4 of the typed prefix), zeros after them,
+// no plaintext anywhere in either 4093-byte area.
+void expectSealed(const KeyboardSession& s, std::size_t length, const char* after) {
+  SCOPED_TRACE(after);
+  const ContentStore& store = *s.content;
+  ASSERT_EQ(store.length.load(), length);
+  unsigned char keystream[kContentBufferSize];
+  sealKeystream(keystream, length);
+  std::size_t mismatches = 0, nonZeroTail = 0;
+  for (std::size_t i = 0; i < length; ++i) {
+    if (store.plaintext[i] != static_cast<unsigned char>(kPassword[i] ^ keystream[i])) ++mismatches;
+  }
+  for (std::size_t i = length; i < kContentBufferSize; ++i) nonZeroTail += store.plaintext[i] != 0;
+  EXPECT_EQ(mismatches, 0u) << "resting bytes are not RC4(text) under the seal key";
+  EXPECT_EQ(nonZeroTail, 0u) << "bytes after the sealed text are not zero";
+  const std::size_t probe = length < 4 ? length : 4;
+  if (probe > 0) {
+    EXPECT_EQ(memmem(store.plaintext, kContentBufferSize, kPassword, probe), nullptr) << "plaintext at rest";
+    EXPECT_EQ(memmem(store.scratch, kContentBufferSize, kPassword, probe), nullptr) << "plaintext in scratch";
+  }
+}
+
+bool sameBytes(const SecureBuffer& b, const char* expected, std::size_t n) {
+  return b && b.size() == n && std::memcmp(b.data(), expected, n) == 0;
+}
+
+class Hygiene : public ::testing::Test {
+ protected:
+  static void SetUpTestSuite() {
+    void* frames[4];
+    backtrace(frames, 4);  // loads the unwinder now, not from inside free()
+  }
+  void SetUp() override {
+#ifdef TESSEL_HYGIENE_SANITIZED
+    GTEST_SKIP() << "a sanitizer owns the allocator; this suite runs in the plain build";
+#endif
+    buildNeedles();
+    encModulus_ = encKey().modulusHex();  // loads the key (OpenSSL) before any scan
+  }
+
+  // A full keyboard with the standard layout, as ScopedKeyboard sets it up, kept in the test's
+  // hands so that destroy can be scanned too.
+  int createKeyboard(const char* name) {
+    const int handle = createSession(name);
+    KeyboardSession* s = sessionAt(handle);
+    if (s == nullptr) return -1;
+    setAccepts(*s, "[[:print:]]*");
+    setMaxLength(*s, 64);
+    setMinLength(*s, 6);
+    setContentType(*s, 7);
+    setDictionaryFilter(*s, "123456,qwerty,password");
+    setEncryPlat(*s, encModulus_.c_str(), false);
+    setChallengeCode(*s, "challenge-0042");
+    buildLayout(*s);
+    applySurfaceGeometry(*s, kWidth, kHeight, 0);
+    return handle;
+  }
+
+  // Types the password one character at a time (no heap copy of it in the test).
+  void typePassword(KeyboardSession& s) {
+    Typist typist(s, KeyGrid(kWidth, kHeight), KeyMap::standard());
+    for (std::size_t i = 0; i < kPasswordLength; ++i) {
+      ASSERT_TRUE(typist.type(std::string(1, kPassword[i])));
+    }
+  }
+
+  std::string encModulus_;
+};
+
+TEST_F(Hygiene, ScannerSeesANeedleInAFreedBlock) {
+  // The detector itself: a block holding a needle, freed while armed, must be reported.
+  auto* block = static_cast<char*>(std::malloc(200));
+  std::memset(block, 'x', 200);
+  std::memcpy(block + 100, g_md5Hex, 32);
+  g_hitCount.store(0);
+  g_armed.store(true);
+  std::free(block);
+  g_armed.store(false);
+  EXPECT_EQ(g_hitCount.load(), 1);
+  EXPECT_GT(g_scannedBlocks.load(), 0);
+  // std::string's heap buffer goes through operator delete: scanned too.
+  {
+    std::string s(g_md5Hex, 32);
+    s.append(100, 'y');
+    g_hitCount.store(0);
+    g_armed.store(true);
+  }
+  g_armed.store(false);
+  EXPECT_EQ(g_hitCount.load(), 1);
+  g_hitCount.store(0);
+}
+
+struct OutputStep {
+  const char* what;
+  std::function<bool(KeyboardSession&)> run;  // true when the operation produced its result
+  bool freesTemporaries;                      // allocates and frees on the way (proves the scan ran)
+};
+
+TEST_F(Hygiene, TypedPasswordNeverReachesFreedHeap) {
+  const int handle = createKeyboard("hygiene");
+  ASSERT_GE(handle, 0);
+  KeyboardSession& s = *sessionAt(handle);
+
+  {
+    ScanScope scan("typing (with one character deleted)");
+    typePassword(s);
+    // A typo and its deletion: the delete path reseals too.
+    Typist typist(s, KeyGrid(kWidth, kHeight), KeyMap::standard());
+    ASSERT_TRUE(typist.type(std::string(1, 'j')));
+    ASSERT_EQ(typist.tap(KeyGrid(kWidth, kHeight).deleteKey()), 0);
+  }
+  expectSealed(s, kPasswordLength, "typing");
+
+  const std::vector<OutputStep> steps = {
+      {"contentOutput 48",
+       [](KeyboardSession& k) { return static_cast<bool>(contentOutput(k, 48, "20240101120000")); }, true},
+      {"contentOutput 47",
+       [](KeyboardSession& k) { return static_cast<bool>(contentOutput(k, 47, "20240101120000")); }, true},
+      {"encryptedPinCode", [](KeyboardSession& k) { return static_cast<bool>(encryptedPinCode(k)); }, true},
+      {"computeMeasureValue",
+       [](KeyboardSession& k) { return sameBytes(computeMeasureValue(k), g_md5Hex, 32); }, true},
+      {"sessionDegree", [](KeyboardSession& k) { return sessionDegree(k) != 'E'; }, false},
+      {"sessionVerify", [](KeyboardSession& k) { return sessionVerify(k) == 0; }, false},
+  };
+  // No suffix, then the two salted modes (a suffix can be replaced but never removed).
+  const char* const hashRandoms[] = {nullptr, kHashRandomS, kHashRandomF};
+  for (const char* hashRandom : hashRandoms) {
+    if (hashRandom != nullptr) setHashRandom(s, hashRandom);
+    for (const OutputStep& step : steps) {
+      const std::string what = std::string(step.what) + (hashRandom == nullptr ? "" : " with hash random ") +
+                               (hashRandom == nullptr ? "" : hashRandom);
+      SCOPED_TRACE(what);
+      bool produced = false;
+      {
+        ScanScope scan(what.c_str());
+        produced = step.run(s);
+        if (step.freesTemporaries) {
+          EXPECT_GT(scan.scanned(), 0) << "no freed block was scanned";
+        }
+      }
+      EXPECT_TRUE(produced) << "lastError " << static_cast<int>(s.content->lastError);
+      expectSealed(s, kPasswordLength, what.c_str());
+    }
+  }
+
+  {
+    ScanScope scan("destroySession");
+    destroySession(handle);
+  }
+  EXPECT_EQ(sessionAt(handle), nullptr);
+}
+
+TEST_F(Hygiene, ClearAndEvictionLeaveNothingBehind) {
+  // Clearing through the number pad's clear key, then typing again and losing the session to
+  // eviction by 20 newer ones: both paths free or wipe without leaving the text.
+  const int handle = createKeyboard("hygiene-clear");
+  ASSERT_GE(handle, 0);
+  KeyboardSession& s = *sessionAt(handle);
+  typePassword(s);
+  {
+    ScanScope scan("clear on the number pad");
+    setKbdType(s, 2);
+    Typist pad(s, KeyGrid(kWidth, kHeight), KeyMap::standard());
+    ASSERT_EQ(pad.tap(KeyGrid(kWidth, kHeight).padCell(1, 3)), 0);
+  }
+  expectSealed(s, 0, "clear");
+  setKbdType(s, 0);
+  typePassword(s);
+  expectSealed(s, kPasswordLength, "typing again");
+
+  // Fresh names fill the free slots first; once all twenty are taken each create evicts one.
+  const auto stillOurs = [&] {
+    const KeyboardSession* now = sessionAt(handle);
+    return now != nullptr && now->sessionName != nullptr && std::strcmp(now->sessionName, "hygiene-clear") == 0;
+  };
+  char name[32];
+  {
+    ScanScope scan("eviction by newer sessions");
+    for (int i = 0; i < 2 * kSessionSlots && stillOurs(); ++i) {
+      std::snprintf(name, sizeof name, "hygiene-evictor-%d", i);
+      ASSERT_GE(createSession(name), 0);
+    }
+  }
+  EXPECT_FALSE(stillOurs());
+  for (int slot = 0; slot < kSessionSlots; ++slot) destroySession(slot);
+}
+
+}  // namespace
+}  // namespace tessel::test
