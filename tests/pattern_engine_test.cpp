@@ -138,6 +138,13 @@ TEST(PatternMatch, ResultLayout) {
   EXPECT_EQ(spans("(a){0}b", "b"), (MatchResult{1, 1, 0, 1, -1, -1}));
 }
 
+TEST(PatternMatch, TwoEmptyWaysInARowEndTheSearch) {
+  // The whole-text match gives up when two successive ways of matching both end at the start.
+  EXPECT_FALSE(spans("(a*?|)(|)", "a").empty()) << "one empty way, then progress";
+  EXPECT_TRUE(spans("(a*?|)(||)", "a").empty()) << "two empty ways in a row";
+  EXPECT_FALSE(spans("(a*?|)(||)", "").empty()) << "nothing to consume: the first way matches";
+}
+
 TEST(PatternMatch, NoTreeMatchesNothing) {
   for (const char* p : {static_cast<const char*>(nullptr), ""}) {
     PatternEngine e(p);

@@ -62,6 +62,8 @@ bool MatchContext::reset(const std::uint8_t* t, std::int32_t n, int groups, bool
   start = rightToLeft ? n : 0;
   end = rightToLeft ? 0 : n;
   pos = start;
+  lastStart = -1;
+  stoppedWithoutProgress = false;
   top = 0;
   stepsLeft = stepBudget;
   return true;
@@ -407,8 +409,17 @@ bool PatternEngine::run(MatchContext& c, const std::uint8_t* text, std::size_t l
   if (!c.reset(text, static_cast<std::int32_t>(length), groups_, rightToLeft_)) return false;
   try {
     if (!root_->match(c)) return false;
+    // Ask the tree for its next way of matching until one consumes the whole text. Two ways in a
+    // row that both end where matching began count as no progress and end the search: that is
+    // the documented behaviour of the whole-text match (it only matters for patterns with several
+    // empty alternatives, such as "(a*?|)(||)" against "a").
     while (c.pos != c.end) {
       if (!root_->matchNext(c)) return false;
+      if (c.lastStart == c.start && c.start == c.pos) {
+        c.stoppedWithoutProgress = true;
+        return false;
+      }
+      c.lastStart = c.pos;
     }
   } catch (const MatchAborted&) {
     return false;

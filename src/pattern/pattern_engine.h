@@ -28,8 +28,10 @@
 //   "(?#", a "[:" without its closing ":]", and parenthesis nesting deeper than kMaxNesting.
 // - The driver asks the root for its next way until one ends at the end of the text. Every
 //   way is a distinct path and there are finitely many (loops never repeat an empty
-//   iteration), so no separate no-progress guard is needed: a pattern matches exactly when
-//   some way consumes the whole text.
+//   iteration), so the search always ends. It also ends, without a match, when two ways in a
+//   row both end where matching began (the no-progress rule of the whole-text match): apart
+//   from patterns with several empty alternatives, such as "(||)|." against "c", a pattern
+//   matches exactly when some way consumes the whole text.
 // - Inside a set a backslash still escapes ("[\]\-]"), and \b there is backspace.
 // - '^' and \A match at offset 0; '$' and \Z at the end or before a final '\n'; \z at the
 //   end; \G at the position the match started from; \b and \B use \w (alnum and '_').
@@ -92,6 +94,8 @@ class MatchContext {
   std::int32_t start = 0;       // where matching began (0, or length when right-to-left)
   std::int32_t pos = 0;         // current position
   std::int32_t end = 0;         // where a whole match must finish
+  std::int32_t lastStart = -1;  // where the previous way of matching ended (no-progress rule)
+  bool stoppedWithoutProgress = false;  // the last match ended on the no-progress rule
   std::int64_t stepsLeft = 0;
   // Steps taken by the last match: at most stepBudget + 1, the +1 meaning "gave up".
   std::int64_t stepsUsed() const noexcept { return stepBudget - stepsLeft; }
