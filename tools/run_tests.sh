@@ -1,6 +1,7 @@
 #!/usr/bin/env bash
 # Builds and runs every test: the release build with warnings as errors, then the whole suite
-# again under AddressSanitizer + UndefinedBehaviorSanitizer. Exits non-zero on any failure.
+# again under AddressSanitizer + UndefinedBehaviorSanitizer, a libFuzzer smoke run and the
+# thread stress suite under ThreadSanitizer. Exits non-zero on any failure.
 set -euo pipefail
 cd "$(dirname "${BASH_SOURCE[0]}")/.."
 bash tools/setup/setup.sh
@@ -22,3 +23,6 @@ ASAN_OPTIONS=detect_leaks=1:strict_string_checks=1 UBSAN_OPTIONS=print_stacktrac
 
 echo "== libFuzzer smoke run (clang, ASan+UBSan, about 12 s per target on fuzz/corpus)"
 bash tools/run_fuzz.sh smoke
+
+echo "== ThreadSanitizer: the UI/GL thread stress suite"
+bash tools/run_tsan.sh
