@@ -47,19 +47,21 @@ using namespace tessel;
 namespace {
 
 // Deterministic across standard libraries: only the raw engine output is used.
+// Texts are made of letters, digits, punctuation (including the set syntax's own '-' and '_'),
+// white space and two bytes outside every class.
 class Rng {
  public:
   explicit Rng(std::uint32_t seed) : engine_(seed) {}
   int below(int n) { return static_cast<int>(engine_() % static_cast<std::uint32_t>(n)); }
   bool chance(int percent) { return below(100) < percent; }
+  char textByte() {
+    static const char kUniverse[] = "abcAB12!-_ \n\x80\xFF";
+    return kUniverse[below(sizeof kUniverse - 1)];
+  }
 
  private:
   std::mt19937 engine_;
 };
-
-// Bytes the texts are made of: letters, digits, punctuation (including the set syntax's own
-// '-' and '_'), white space and two bytes outside every class.
-const std::string kUniverse = std::string("abcAB12!-_ \n") + '\x80' + '\xFF';
 
 struct ClassInfo {
   const char* name;
@@ -98,10 +100,7 @@ class Generator {
  public:
   explicit Generator(Rng& rng) : rng_(rng) {}
 
-  GenNode pattern() {
-    groups_ = 0;
-    return alternation(0);
-  }
+  GenNode pattern() { return alternation(0); }
 
  private:
   GenNode alternation(int depth) {
@@ -205,7 +204,6 @@ class Generator {
   }
 
   Rng& rng_;
-  int groups_ = 0;
   int repeatDepth_ = 0;
 };
 
@@ -278,7 +276,7 @@ bool render(const GenNode& n, Dialect d, std::string& out) {
 void sample(const GenNode& n, Rng& rng, std::string& out) {
   auto pickByte = [&](auto&& member) {
     for (int tries = 0; tries < 8; ++tries) {
-      const auto b = static_cast<std::uint8_t>(kUniverse[static_cast<std::size_t>(rng.below(static_cast<int>(kUniverse.size())))]);
+      const auto b = static_cast<std::uint8_t>(rng.textByte());
       if (member(b)) {
         out += static_cast<char>(b);
         return;
@@ -336,19 +334,17 @@ bool repeatsEmptyCapable(const GenNode& n) {
 std::string randomText(Rng& rng) {
   std::string s;
   const int n = rng.below(8);
-  for (int i = 0; i < n; ++i) s += kUniverse[static_cast<std::size_t>(rng.below(static_cast<int>(kUniverse.size())))];
+  for (int i = 0; i < n; ++i) s += rng.textByte();
   return s;
 }
 
 std::string mutate(std::string s, Rng& rng) {
   if (s.empty() || rng.chance(30)) {
-    s.insert(s.begin() + rng.below(static_cast<int>(s.size()) + 1),
-             kUniverse[static_cast<std::size_t>(rng.below(static_cast<int>(kUniverse.size())))]);
+    s.insert(s.begin() + rng.below(static_cast<int>(s.size()) + 1), rng.textByte());
   } else if (rng.chance(50)) {
     s.erase(s.begin() + rng.below(static_cast<int>(s.size())));
   } else {
-    s[static_cast<std::size_t>(rng.below(static_cast<int>(s.size())))] =
-        kUniverse[static_cast<std::size_t>(rng.below(static_cast<int>(kUniverse.size())))];
+    s[static_cast<std::size_t>(rng.below(static_cast<int>(s.size())))] = rng.textByte();
   }
   return s;
 }

@@ -13,6 +13,7 @@
 #include "pattern/password_measures.h"
 #include "pattern/strength.h"
 #include "session/session.h"
+#include "support/keyboard_typist.h"
 
 using namespace tessel;
 
@@ -75,27 +76,10 @@ TEST(StrengthDispatch, EveryRuleSetUsesItsRating) {
 
 // ---- ratings
 
-TEST(StrengthRatings, DocumentedCases) {
-  struct Case {
-    std::uint32_t ruleSet;
-    const char* text;
-    char expected;
-  } cases[] = {
-      {48, "", 'E'},          {6, "", 'W'},           {0, "", 'W'},
-      {48, "123456", 'W'},    {48, "abcdef", 'W'},    {48, "abc123", 'M'},
-      {48, "aaaa12", 'W'},    {48, "ab1!cd", 'S'},    {48, "12345", 'W'},
-      {34, "12345", 'T'},     {34, "111111", 'T'},    {34, "123456", 'T'},
-      {34, "901234", 'T'},    {34, "654321", 'T'},    {34, "112233", 'W'},
-      {34, "121314", 'R'},    {1, "abcdefgh", 'W'},   {1, "k3Hq9!", 'S'},
-      {1, "kqhzmw", 'M'},     {6, "password", 'M'},   {6, "Password", 'S'},
-      {6, "abcdefgh", 'W'},   {6, "pass1234", 'S'},   {0, "12345678901", 'W'},
-      {0, "abcdef", 'M'},     {0, "abcDEF", 'S'},
-  };
-  for (const Case& c : cases)
-    EXPECT_EQ(rateStrength(c.ruleSet, c.text), c.expected) << c.ruleSet << " '" << c.text << "'";
-}
-
-TEST(StrengthRatings, Boundaries) {
+// Ratings at their boundaries: 5/6 bytes, runs against the ceiling (general) or floor
+// (strict) of half the length, frequency against 2n/3 (numeric); plus examples of each rating
+// that the probe texts above do not reach.
+TEST(StrengthRatings, BoundariesAndExamples) {
   struct Case {
     std::uint32_t ruleSet;
     const char* text;
@@ -139,6 +123,20 @@ TEST(StrengthRatings, Boundaries) {
       {0, "abcde", 'W', "default: five bytes of anything"},
       {0, "ABCDEF", 'M', "default: six upper-case letters"},
       {0, "abcdef1", 'S', "default: letters and a digit"},
+      {0, "abcDEF", 'S', "default: both letter cases"},
+      {0, "12345678901", 'W', "default: digits only"},
+      {48, "aaaa12", 'W', "numeric: frequency 4 = 12/3"},
+      {48, "123456", 'W', "numeric: digits only"},
+      {34, "111111", 'T', "strict: one digit"},
+      {34, "123456", 'T', "strict: ascending"},
+      {34, "901234", 'T', "strict: ascending with the 9-0 wrap"},
+      {34, "654321", 'T', "strict: descending"},
+      {34, "112233", 'W', "strict: pairs"},
+      {34, "121314", 'R', "strict: a digit three times in six"},
+      {1, "abcdefgh", 'W', "general: one long run"},
+      {1, "kqhzmw", 'M', "general: letters alone"},
+      {6, "password", 'M', "letters-required: lower case only"},
+      {6, "pass1234", 'S', "letters-required: letters and digits"},
   };
   for (const Case& c : cases) EXPECT_EQ(rateStrength(c.ruleSet, c.text), c.expected) << c.why;
   EXPECT_EQ(rateStrength(48, nullptr), 'E');
@@ -302,115 +300,75 @@ using Words = std::vector<std::string>;
 
 }  // namespace
 
-TEST(Dictionary, OneByteEntriesSurviveOnlyAtTheEnd) {
-  EXPECT_EQ(parsed("abc,x,def"), (Words{"abc", "def"}));
-  EXPECT_EQ(parsed("abc,x"), (Words{"abc", "x"}));
-  EXPECT_EQ(parsed("x"), (Words{"x"}));
-  EXPECT_EQ(parsed("x,"), Words{});
-  EXPECT_EQ(parsed("ab,"), (Words{"ab"}));
-  EXPECT_EQ(parsed(",ab"), (Words{"ab"}));
-  EXPECT_EQ(parsed("a,,b"), (Words{"b"}));
-  EXPECT_EQ(parsed(",,"), Words{});
-  EXPECT_EQ(parsed(","), Words{});
-  EXPECT_EQ(parsed(""), Words{});
-  EXPECT_EQ(parsed(nullptr), (Words{"<null>"}));
-  EXPECT_EQ(parsed("123456,qwerty"), (Words{"123456", "qwerty"}));
-  EXPECT_EQ(parsed("a b,c d"), (Words{"a b", "c d"}));  // spaces are part of entries
-}
-
-TEST(Dictionary, GrowsPastTenEntries) {
-  std::string text;
-  Words expected;
+// One-byte entries survive only at the end; the list grows past its initial ten entries (the
+// 25-entry list, and ten entries filling the array before a final one-byte entry).
+TEST(Dictionary, Parsing) {
+  std::string many, ten;
+  Words manyWords, tenWords;
   for (int i = 0; i < 25; ++i) {
-    const std::string w = "w" + std::to_string(100 + i);
-    text += (i ? "," : "") + w;
-    expected.push_back(w);
+    manyWords.push_back("w" + std::to_string(100 + i));
+    many += (i ? "," : "") + manyWords.back();
   }
-  EXPECT_EQ(parsed(text.c_str()), expected);
-  // Ten entries fill the initial array; the last one-byte entry grows it by one.
-  text.clear();
-  expected.clear();
   for (int i = 0; i < 10; ++i) {
-    text += "e" + std::to_string(i) + ",";
-    expected.push_back("e" + std::to_string(i));
+    tenWords.push_back("e" + std::to_string(i));
+    ten += tenWords.back() + ",";
   }
-  text += "z";
-  expected.push_back("z");
-  EXPECT_EQ(parsed(text.c_str()), expected);
+  ten += "z";
+  tenWords.push_back("z");
+  const struct {
+    const char* text;
+    Words expected;
+  } cases[] = {
+      {"abc,x,def", {"abc", "def"}}, {"abc,x", {"abc", "x"}}, {"x", {"x"}},    {"x,", {}},
+      {"ab,", {"ab"}},               {",ab", {"ab"}},         {"a,,b", {"b"}}, {",,", {}},
+      {",", {}},                     {"", {}},                {nullptr, {"<null>"}},
+      {"a b,c d", {"a b", "c d"}},  // spaces are part of entries
+      {many.c_str(), manyWords},     {ten.c_str(), tenWords},
+  };
+  for (const auto& c : cases) EXPECT_EQ(parsed(c.text), c.expected) << (c.text ? c.text : "(null)");
 }
 
-// ---- session operations
+// ---- session operations: rule set 48 for the degree, the rule built from the session's
+// settings for verify, and the content sealed again unchanged after each.
 
-namespace {
-
-class StrengthSession : public ::testing::Test {
- protected:
-  void SetUp() override {
-    handle_ = createSession("strength-test");
-    ASSERT_GE(handle_, 0);
-    s_ = sessionAt(handle_);
-    ASSERT_NE(s_, nullptr);
-  }
-  void TearDown() override {
-    // The session's release set deliberately keeps the dictionary text; free it here.
-    releaseOwnedText(s_->content->dictionaryFilter);
-    destroySession(handle_);
-  }
-  void type(const std::string& text) {
-    ContentGuard guard(*s_->content);
+TEST(StrengthSession, DegreeAndVerifyFromTheSettingsReseal) {
+  test::ScopedKeyboard kb("strength-test", 100, 40, false, nullptr, 4092);
+  KeyboardSession& s = kb.session();
+  const auto type = [&](const std::string& text) {
+    ContentGuard guard(*s.content);
     std::memset(guard.text(), 0, kContentBufferSize);
     std::memcpy(guard.text(), text.data(), text.size());
-    guard.text()[text.size()] = 0;
-    s_->content->length = static_cast<std::uint16_t>(text.size());
+    s.content->length = static_cast<std::uint16_t>(text.size());
+  };
+  EXPECT_EQ(sessionDegree(s), 'E');
+  EXPECT_EQ(sessionVerify(s), -1);
+  const struct {
+    const char* text;
+    char degree;
+  } degrees[] = {{"abc123", 'M'}, {"123456", 'W'}, {"ab1!cd", 'S'}};
+  for (const auto& d : degrees) {
+    type(d.text);
+    const std::string sealed = kb.restingBuffer();
+    ASSERT_EQ(sealed.find(d.text), std::string::npos);
+    EXPECT_EQ(sessionDegree(s), d.degree) << d.text;
+    EXPECT_EQ(kb.restingBuffer(), sealed) << "content must be sealed again, unchanged";
   }
-  std::string sealedBytes() const {
-    return std::string(reinterpret_cast<const char*>(s_->content->plaintext), s_->content->length);
-  }
-  std::string unsealed() {
-    ContentGuard guard(*s_->content);
-    return std::string(reinterpret_cast<const char*>(guard.text()), guard.length());
-  }
-
-  int handle_ = -1;
-  KeyboardSession* s_ = nullptr;
-};
-
-}  // namespace
-
-TEST_F(StrengthSession, DegreeUsesRuleSet48AndReseals) {
-  EXPECT_EQ(sessionDegree(*s_), 'E');
-  type("abc123");
-  const std::string sealed = sealedBytes();
-  ASSERT_NE(sealed, "abc123");
-  EXPECT_EQ(sessionDegree(*s_), 'M');
-  EXPECT_EQ(sealedBytes(), sealed) << "content must be sealed again, unchanged";
-  type("123456");
-  EXPECT_EQ(sessionDegree(*s_), 'W');
-  type("ab1!cd");
-  EXPECT_EQ(sessionDegree(*s_), 'S');
-}
-
-TEST_F(StrengthSession, VerifyBuildsTheRuleFromTheSettings) {
   type("abcdef");
-  EXPECT_EQ(sessionVerify(*s_), -3) << "no accepts pattern set";
-  ASSERT_TRUE(replaceOwnedText(s_->accepts, "[:alnum:]+"));
-  s_->minLength = 6;
-  s_->content->contentType = 3;
-  const std::string sealed = sealedBytes();
-  EXPECT_EQ(sessionVerify(*s_), -6);
-  EXPECT_EQ(sealedBytes(), sealed);
-  EXPECT_EQ(unsealed(), "abcdef");
+  EXPECT_EQ(sessionVerify(s), -3) << "no accepts pattern set";
+  ASSERT_TRUE(replaceOwnedText(s.accepts, "[:alnum:]+"));
+  s.minLength = 6;
+  s.content->contentType = 3;
+  const std::string sealed = kb.restingBuffer();
+  EXPECT_EQ(sessionVerify(s), -6);
+  EXPECT_EQ(kb.restingBuffer(), sealed);
+  EXPECT_EQ(kb.text(), "abcdef");
   type("abc123");
-  EXPECT_EQ(sessionVerify(*s_), 0);
-  ASSERT_TRUE(replaceOwnedText(s_->content->dictionaryFilter, "x,abc123"));
-  EXPECT_EQ(sessionVerify(*s_), -5);
-  s_->minLength = 7;
-  EXPECT_EQ(sessionVerify(*s_), -2);
-  type("");
-  EXPECT_EQ(sessionVerify(*s_), -1);
-}
-
-TEST(StrengthSessionRule, UnbuildableRuleGivesMinusFour) {
+  EXPECT_EQ(sessionVerify(s), 0);
+  ASSERT_TRUE(replaceOwnedText(s.content->dictionaryFilter, "x,abc123"));
+  EXPECT_EQ(sessionVerify(s), -5);
+  s.minLength = 7;
+  EXPECT_EQ(sessionVerify(s), -2);
+  releaseOwnedText(s.content->dictionaryFilter);  // the session's release deliberately keeps it
   KeyboardSession bare;  // no content store: the rule cannot be built
   EXPECT_EQ(sessionVerify(bare), -4);
   PasswordRule rule;

@@ -6,10 +6,9 @@
 
 #include <algorithm>
 #include <cstdlib>
-#include <cstring>
-#include <vector>
 #include <set>
 #include <string>
+#include <vector>
 
 #include "render/glyph_index.h"
 #include "render/image_table.h"
@@ -68,26 +67,22 @@ TEST(ImageTable, GroupsHaveTheirSizesAndIndexes) {
     const ImageGroup& g;
     std::vector<std::pair<int, int>> sizes;
   };
-  const std::pair<int, int> glyph{64, 128};
+  const std::vector<std::pair<int, int>> glyphs(26, {64, 128});
   const Group groups[] = {
-      {"letters", kLetterGlyphs, std::vector<std::pair<int, int>>(26, glyph)},
-      {"shifted", kShiftedLetterGlyphs, std::vector<std::pair<int, int>>(26, glyph)},
-      {"symbols", kSymbolGlyphs, std::vector<std::pair<int, int>>(26, glyph)},
-      {"symbols2", kSymbolShiftGlyphs, std::vector<std::pair<int, int>>(26, glyph)},
-      {"pad digits", kPadDigitGlyphs, std::vector<std::pair<int, int>>(10, glyph)},
+      {"letters", kLetterGlyphs, glyphs},
+      {"shifted", kShiftedLetterGlyphs, glyphs},
+      {"symbols", kSymbolGlyphs, glyphs},
+      {"symbols2", kSymbolShiftGlyphs, glyphs},
+      {"pad digits", kPadDigitGlyphs, {glyphs.begin(), glyphs.begin() + 10}},
       {"char keys", kCharKeys, {{128, 256}, {128, 256}, {128, 256}}},
-      {"space", kSpaceKeys, {{512, 256}, {512, 256}}},
-      {"space label", kSpaceLabel, {{256, 128}}},
+      {"space", kSpaceKeys, {{512, 256}, {512, 256}}},        {"space label", kSpaceLabel, {{256, 128}}},
       {"shift/delete", kShiftDeleteKeys, {{128, 256}, {128, 256}}},
-      {"switch", kSwitchKeys, {{256, 256}, {256, 256}}},
-      {"done", kDoneKeys, {{128, 128}, {256, 256}}},
+      {"switch", kSwitchKeys, {{256, 256}, {256, 256}}},      {"done", kDoneKeys, {{128, 128}, {256, 256}}},
       {"icons", kIcons, {{64, 64}, {64, 64}, {64, 64}, {64, 64}}},
       {"labels", kLabels, {{256, 128}, {256, 128}, {128, 64}, {128, 64}, {256, 128}}},
-      {"pad keys", kPadKeys, {{256, 128}, {256, 128}}},
-      {"pad done", kPadDoneKeys, {{128, 128}, {256, 256}}},
+      {"pad keys", kPadKeys, {{256, 128}, {256, 128}}},      {"pad done", kPadDoneKeys, {{128, 128}, {256, 256}}},
       {"pad labels", kPadLabels, {{128, 64}, {128, 64}, {64, 128}, {64, 64}}},
-      {"pad done icon", kPadDoneIcon, {{64, 64}}},
-      {"cursor", kCursor, {{64, 64}}},
+      {"pad done icon", kPadDoneIcon, {{64, 64}}},           {"cursor", kCursor, {{64, 64}}},
   };
   for (const Group& g : groups) {
     ASSERT_EQ(g.g.count, static_cast<int>(g.sizes.size())) << g.name;

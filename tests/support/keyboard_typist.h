@@ -49,15 +49,12 @@ class ScopedKeyboard {
 class KeyGrid {
  public:
   KeyGrid(int width, int height) : kw_(width / 10.0), kh_(height / 4.0) {}
-  double keyWidth() const { return kw_; }
-  double keyHeight() const { return kh_; }
   // Character key `position` (0-based within the row) of full-keyboard row 0, 1 or 2.
   TouchPoint characterKey(int row, int position) const;
   TouchPoint shiftKey() const { return at(0.75, 2); }
   TouchPoint deleteKey() const { return at(9.25, 2); }
   TouchPoint switchKey() const { return at(1.25, 3); }
   TouchPoint spaceKey() const { return at(5.0, 3); }
-  TouchPoint doneKey() const { return at(8.75, 3); }
   // Number-pad cell (row 0..3, column 0..3), each column 2.5 key widths wide.
   TouchPoint padCell(int row, int column) const;
 

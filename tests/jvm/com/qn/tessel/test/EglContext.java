@@ -37,27 +37,19 @@ final class EglContext implements AutoCloseable {
       t.setDaemon(true);
       return t;
     });
-    long h = 0;
-    String error = null;
-    String name = null;
-    try {
-      long[] made = new long[1];
-      String[] text = new String[2];
-      call(() -> {
-        made[0] = nativeCreate(width, height);
-        text[0] = made[0] == 0 ? nativeLastError() : null;
-        text[1] = made[0] != 0 ? nativeRenderer() : null;
-        return null;
-      });
-      h = made[0];
-      error = text[0];
-      name = text[1];
-    } finally {
-      if (h == 0) thread.shutdownNow();
+    long[] made = new long[1];
+    String[] text = new String[1];
+    call(() -> {
+      made[0] = nativeCreate(width, height);
+      text[0] = made[0] == 0 ? nativeLastError() : nativeRenderer();
+      return null;
+    });
+    if (made[0] == 0) {
+      thread.shutdownNow();
+      throw new IllegalStateException("no offscreen GLES 1.1 context: " + text[0]);
     }
-    if (h == 0) throw new IllegalStateException("no offscreen GLES 1.1 context: " + error);
-    this.handle = h;
-    this.renderer = name;
+    this.handle = made[0];
+    this.renderer = text[0];
   }
 
   String renderer() {
@@ -84,14 +76,9 @@ final class EglContext implements AutoCloseable {
 
   /** The pbuffer as RGBA bytes, top row first (the orientation of the app's touch coordinates). */
   byte[] readRgba() throws Exception {
-    byte[] bottomUp = call(() -> nativeReadPixels(handle));
-    if (bottomUp == null) throw new IllegalStateException("glReadPixels failed");
-    byte[] topDown = new byte[bottomUp.length];
-    int stride = width * 4;
-    for (int row = 0; row < height; ++row) {
-      System.arraycopy(bottomUp, row * stride, topDown, (height - 1 - row) * stride, stride);
-    }
-    return topDown;
+    byte[] rgba = call(() -> nativeReadPixels(handle));
+    if (rgba == null) throw new IllegalStateException("glReadPixels failed");
+    return rgba;
   }
 
   @Override

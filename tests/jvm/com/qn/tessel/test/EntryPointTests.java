@@ -36,11 +36,8 @@ final class EntryPointTests {
     return new Row(name, refused, refused, call);
   }
 
-  static Row sink(String name, Call call) {  // methods without a result
-    return new Row(name, null, null, h -> {
-      call.call(h);
-      return null;
-    });
+  static Row sink(String name, Call call) {  // methods without a result: the call returns null
+    return new Row(name, null, null, call);
   }
 
   /** The 50 methods that take a handle, each with valid arguments apart from the handle. */
@@ -101,9 +98,8 @@ final class EntryPointTests {
   }
 
   static void run() throws Exception {
-    Check.test("the sweep covers the 50 methods that take a handle", () -> Check.equal(50, rows().size(), "rows"));
-
     Check.test("handles without a session return the documented values", () -> {
+      Check.equal(50, rows().size(), "the sweep covers the 50 methods that take a handle");
       JvmSuite.destroyAll();
       final int[] handles = {-1, -20, Integer.MIN_VALUE, 0, 19, 20, 1000, Integer.MAX_VALUE};
       for (int h : handles) {
@@ -170,14 +166,6 @@ final class EntryPointTests {
       JvmSuite.destroyAll();
       Check.equal(0, createNativeSession("s5"), "after destroying all, slot 0 first");
       JvmSuite.destroyAll();
-    });
-
-    Check.test("version for any handle >= 0", () -> {
-      final int[] handles = {0, 5, 19, 20, 12345};
-      for (int h : handles) {
-        Check.equal(3070005L, getNativeVersion(h), "getNativeVersion(" + h + ")");
-        Check.equal("3.7.0.5", getNativeStringVersion(h), "getNativeStringVersion(" + h + ")");
-      }
     });
   }
 }

@@ -18,8 +18,6 @@ final class KeyboardDriver {
   static final String PAD = "1234567890";
 
   final int handle;
-  final double width;
-  final double height;
   final double kw;
   final double kh;
   boolean symbolPage;
@@ -27,8 +25,6 @@ final class KeyboardDriver {
 
   KeyboardDriver(int handle, int width, int height) {
     this.handle = handle;
-    this.width = width;
-    this.height = height;
     this.kw = width / 10.0;
     this.kh = height / 4.0;
   }

@@ -12,8 +12,9 @@ import java.util.Arrays;
 /**
  * Typing through setNativeTouchPos, with the surface callbacks on their own GL thread and the
  * touches on the test's main thread (the app's UI thread), and every setter that shapes what a
- * key press does. What was typed is read back the way the bank does: the content is opened by
- * the server-side tool, and the measure value is compared with the JVM's MD5.
+ * key press does, each shown reaching the session once (the rules themselves are covered by the
+ * C++ input and settings suites). What was typed is read back the way the bank does: the content
+ * is opened by the server-side tool, and the measure value is compared with the JVM's MD5.
  */
 final class KeyboardTests {
   private KeyboardTests() {}
@@ -24,17 +25,29 @@ final class KeyboardTests {
     Check.equal(text.isEmpty() ? null : Oracles.md5Hex(text), getNativeMeasureValue(k.handle), "measure value");
   }
 
-  static void run() throws Exception {
-    try (EglContext gl = new EglContext(WIDTH, HEIGHT)) {
-      System.out.println("    GL renderer: " + gl.renderer());
-      cases(gl);
-    }
+  /** A session set up before its surface exists: settings that apply when the layout is built. */
+  static KeyboardDriver unbuilt(EglContext gl, String name, String accepts, short style, boolean random)
+      throws Exception {
+    int h = createNativeSession(name);
+    setNativeMaxLength(h, (short) 64);
+    setNativeAccepts(h, accepts);
+    setNativeKbdStyle(h, style);
+    setNativeKbdRandom(h, random);
+    surface(gl, h);
+    return new KeyboardDriver(h, WIDTH, HEIGHT);
   }
 
   private static String sorted(String s) {
     char[] c = s.toCharArray();
     Arrays.sort(c);
     return new String(c);
+  }
+
+  static void run() throws Exception {
+    try (EglContext gl = new EglContext(WIDTH, HEIGHT)) {
+      System.out.println("    GL renderer: " + gl.renderer());
+      cases(gl);
+    }
   }
 
   private static void cases(EglContext gl) throws Exception {
@@ -45,7 +58,6 @@ final class KeyboardTests {
       k.type(text);
       expectTyped(k, text);
       Check.equal(k.handle, createNativeSession("password"), "create with the same name finds the session");
-      Check.equal(text.length(), getNativeContentLen(k.handle), "and keeps its text");
       Check.equal(0, k.deleteKey(), "delete");
       expectTyped(k, text.substring(0, text.length() - 1));
       Check.equal(TOUCH_DONE, k.doneKey(), "done");
@@ -54,59 +66,42 @@ final class KeyboardTests {
       destroyNativeSession(k.handle);
     });
 
-    Check.test("touches that are not key releases", () -> {
+    Check.test("touches that are not key releases, and odd floats", () -> {
       JvmSuite.destroyAll();
       KeyboardDriver k = keyboard(gl, "touches");
       final float mx = (float) (k.kw / 10);
       final float y = (float) (0.5 * k.kh);
       Check.equal(-1, setNativeTouchPos(k.handle, TOUCH_UP, mx - 0.01f, y), "up inside the left margin");
       Check.equal(0, setNativeTouchPos(k.handle, TOUCH_UP, mx, y), "up exactly at the margin is a key");
-      Check.equal(-1, setNativeTouchPos(k.handle, TOUCH_UP, WIDTH - mx + 0.01f, y), "right margin");
-      Check.equal(-1, setNativeTouchPos(k.handle, TOUCH_UP, 100f, HEIGHT - 1f), "bottom margin");
-      Check.equal(-1, setNativeTouchPos(k.handle, TOUCH_DOWN, 100f, y), "down");
       Check.equal(-1, setNativeTouchPos(k.handle, TOUCH_MOVE, 100f, y), "move");
       Check.equal(-1, setNativeTouchPos(k.handle, 3, 100f, y), "unknown action 3");
       Check.equal(-1, setNativeTouchPos(k.handle, -1, 100f, y), "unknown action -1");
       Check.equal(-1, setNativeTouchPos(k.handle, TOUCH_UP, Float.NaN, y), "NaN x");
       Check.equal(-1, setNativeTouchPos(k.handle, TOUCH_UP, Float.POSITIVE_INFINITY, y), "infinite x");
-      Check.equal(-1, setNativeTouchPos(k.handle, TOUCH_UP, 100f, -5f), "negative y");
       Check.equal(-1, setNativeTouchPos(k.handle, TOUCH_UP, 100f, Float.NaN), "NaN y");
-      // Row 1's dead zones: up to 0.3 key from the left, from 0.7 key before the right edge.
       Check.equal(0, k.tap(0.2 * k.kw, 1.5 * k.kh), "row 1 left dead zone releases nothing");
-      Check.equal(0, k.tap(WIDTH - 0.5 * k.kw, 1.5 * k.kh), "row 1 right dead zone");
       expectTyped(k, "q");  // only the up exactly at the margin typed
       destroyNativeSession(k.handle);
     });
 
-    Check.test("maximum length, and negative lengths ignored", () -> {
+    Check.test("maximum length and accepts pattern filter every key", () -> {
       JvmSuite.destroyAll();
-      KeyboardDriver k = keyboard(gl, "maxlength");
-      setNativeMaxLength(k.handle, (short) 6);
-      setNativeMaxLength(k.handle, (short) -1);
-      k.type("abcdefg");
-      expectTyped(k, "abcdef");
-      setNativeMaxLength(k.handle, (short) 7);
-      k.type("g");
-      expectTyped(k, "abcdefg");
-      setNativeMaxLength(k.handle, (short) 0);
-      k.type("h");
-      Check.equal(7, getNativeContentLen(k.handle), "maximum 0 adds nothing");
-      destroyNativeSession(k.handle);
-    });
-
-    Check.test("accepts pattern filters every key", () -> {
-      JvmSuite.destroyAll();
-      int h = createNativeSession("accepts");
-      setNativeMaxLength(h, (short) 20);
-      surface(gl, h);
-      KeyboardDriver k = new KeyboardDriver(h, WIDTH, HEIGHT);
+      KeyboardDriver k = unbuilt(gl, "limits", null, STYLE_LOWER, false);
       k.type("ab");
-      Check.equal(0, getNativeContentLen(h), "no pattern set: nothing is typed");
-      setNativeAccepts(h, "[:digit:]{0,4}");
-      setNativeAccepts(h, null);  // ignored
+      Check.equal(0, getNativeContentLen(k.handle), "no pattern set: nothing is typed");
+      setNativeAccepts(k.handle, "[:digit:]{0,4}");
+      setNativeAccepts(k.handle, null);  // ignored
       k.type("1a2 b3!45");
       expectTyped(k, "1234");
-      destroyNativeSession(h);
+      setNativeAccepts(k.handle, "[:print:]*");
+      setNativeMaxLength(k.handle, (short) 6);
+      setNativeMaxLength(k.handle, (short) -1);  // ignored
+      k.type("abcd");
+      expectTyped(k, "1234ab");
+      setNativeMaxLength(k.handle, (short) 0);
+      k.type("h");
+      Check.equal(6, getNativeContentLen(k.handle), "maximum 0 adds nothing");
+      destroyNativeSession(k.handle);
     });
 
     Check.test("keyboard style: upper case, symbol pages", () -> {
@@ -120,20 +115,13 @@ final class KeyboardTests {
       Check.equal(0, k.tapPosition(2), "e");
       expectTyped(k, "QWe");
       destroyNativeSession(k.handle);
-
       // The page applies when the layout is built: set before the surface exists.
-      int h = createNativeSession("style-symbols");
-      setNativeMaxLength(h, (short) 20);
-      setNativeAccepts(h, "[:print:]*");
-      setNativeKbdStyle(h, STYLE_SYMBOLS_2);
-      surface(gl, h);
-      KeyboardDriver s = new KeyboardDriver(h, WIDTH, HEIGHT);
+      KeyboardDriver s = unbuilt(gl, "style-symbols", "[:print:]*", STYLE_SYMBOLS_2, false);
       s.symbolPage = true;
       s.shift = true;
-      s.type("{5?");
-      s.type("*a");
+      s.type("{5?*a");
       expectTyped(s, "{5?*a");
-      destroyNativeSession(h);
+      destroyNativeSession(s.handle);
     });
 
     Check.test("switch mode 1 opens the digits pad and its function key returns", () -> {
@@ -143,10 +131,8 @@ final class KeyboardTests {
       k.type("a");
       Check.equal(0, k.tap(1.25 * k.kw, 3.5 * k.kh), "switch key");
       k.typePad("12");
-      Check.equal(0, k.tapPad(3, 1), "'.' cell is inert on the digits pad");
       Check.equal(0, k.tapPad(1, 3), "back to the full keyboard (not clear)");
       k.type("b");
-      expectTyped(k, "a12b");
       setNativeSwitchMode(k.handle, (short) 5);  // stored as 0: the switch key toggles symbols
       k.type("+c");
       expectTyped(k, "a12b+c");
@@ -159,18 +145,13 @@ final class KeyboardTests {
       setNativeKbdType(k.handle, KBD_PAD_WITH_POINT);
       k.typePad("90.5");
       Check.equal(0, k.tapPad(0, 3), "pad delete");
-      k.typePad("7");
-      expectTyped(k, "90.7");
+      expectTyped(k, "90.");
       Check.equal(TOUCH_DONE, k.tapPad(3, 2), "row 3 column 2 is done on type 1");
-      Check.equal(TOUCH_DONE, k.tapPad(2, 3), "the function column's done");
       Check.equal(0, k.tapPad(1, 3), "clear");
-      expectTyped(k, "");
       setNativeKbdType(k.handle, KBD_PAD_DIGITS);
       k.typePad("36");
       Check.equal(0, k.tapPad(3, 1), "'.' is inert on type 2");
-      Check.equal(0, k.tapPad(3, 2), "so is row 3 column 2");
       Check.equal(TOUCH_DONE, k.tapPad(3, 3), "done covers rows 2 and 3 of column 3");
-      expectTyped(k, "36");
       setNativeKbdType(k.handle, KBD_FULL);
       k.type("z");
       expectTyped(k, "36z");
@@ -186,7 +167,6 @@ final class KeyboardTests {
       Check.equal(TOUCH_DONE, k.doneKey(), "done, finish mode 1");
       surface(gl, k.handle);
       Check.equal(0, k.tapPosition(0), "position 0");
-      expectTyped(k, "q");
       setNativeFinishMode(k.handle, (short) 9);  // stored as 0
       Check.equal(TOUCH_DONE, k.doneKey(), "done, finish mode 0");
       Check.equal(0, k.tapPosition(0), "before the surface is created again the old layout stays");
@@ -198,46 +178,24 @@ final class KeyboardTests {
 
     Check.test("random layout shuffles keys within their rows", () -> {
       JvmSuite.destroyAll();
-      int h = createNativeSession("random");
-      setNativeMaxLength(h, (short) 64);
-      setNativeAccepts(h, "[:print:]*");
-      setNativeKbdRandom(h, true);
-      surface(gl, h);
-      KeyboardDriver k = new KeyboardDriver(h, WIDTH, HEIGHT);
-      for (int p = 0; p < 26; ++p) Check.equal(0, k.tapPosition(p), "position " + p);
-      String typed = serverContent(h);
-      Check.notNull(typed, "content");
-      if (typed != null && typed.length() == 26) {
-        Check.equal(sorted("qwertyuiop"), sorted(typed.substring(0, 10)), "row 0 keeps its letters");
-        Check.equal(sorted("asdfghjkl"), sorted(typed.substring(10, 19)), "row 1 keeps its letters");
-        Check.equal(sorted("zxcvbnm"), sorted(typed.substring(19)), "row 2 keeps its letters");
-        Check.isTrue(!typed.equals("qwertyuiopasdfghjklzxcvbnm"), "the order changed: " + typed);
-      } else {
-        Check.fail("expected 26 characters, got " + typed);
-      }
-      // The digits row of both symbol pages is one and the same permutation.
-      clearNativePlaintext(h);
-      k.switchKey();
-      for (int p = 0; p < 10; ++p) k.tapPosition(p);
-      k.shiftKey();
-      for (int p = 0; p < 10; ++p) k.tapPosition(p);
-      String digits = serverContent(h);
-      Check.isTrue(digits != null && digits.length() == 20 && digits.substring(0, 10).equals(digits.substring(10))
-              && sorted(digits.substring(0, 10)).equals("0123456789"), "digit rows: " + digits);
-      destroyNativeSession(h);
+      KeyboardDriver k = unbuilt(gl, "random", "[:print:]*", STYLE_LOWER, true);
+      for (int p = 0; p < 26; ++p) k.tapPosition(p);
+      String typed = String.valueOf(serverContent(k.handle));
+      Check.equal(sorted("qwertyuiop") + sorted("asdfghjkl") + sorted("zxcvbnm"),
+          typed.length() != 26 ? typed
+              : sorted(typed.substring(0, 10)) + sorted(typed.substring(10, 19)) + sorted(typed.substring(19)),
+          "each row keeps its letters");
+      Check.isTrue(!typed.equals("qwertyuiopasdfghjklzxcvbnm"), "the order changed: " + typed);
+      destroyNativeSession(k.handle);
     });
 
     Check.test("settings that only store: mode, encrypt type, factor, algorithm, vibrator, app key, ECC", () -> {
       JvmSuite.destroyAll();
       KeyboardDriver k = keyboard(gl, "stored");
-      final short[] modes = {0, 1, 2, 4, -1, Short.MAX_VALUE};
-      for (short m : modes) setNativeMode(k.handle, m);
-      final byte[] types = {0, 47, 48, 90, (byte) 200, -1};
-      for (byte t : types) setNativeEncryptType(k.handle, t);
-      final String[] factors = {"", "0", "1", "2xyz", "0", "9"};
-      for (String f : factors) setNativeKbdFactor(k.handle, f);
-      final String[] codes = {"", "123", ""};
-      for (String c : codes) setNativeAlgorithmCode(k.handle, c);
+      for (short m : new short[] {0, 1, 2, 4, -1, Short.MAX_VALUE}) setNativeMode(k.handle, m);
+      for (byte t : new byte[] {0, 47, 48, 90, (byte) 200, -1}) setNativeEncryptType(k.handle, t);
+      for (String f : new String[] {"", "0", "1", "2xyz", "0", "9"}) setNativeKbdFactor(k.handle, f);
+      for (String c : new String[] {"", "123", ""}) setNativeAlgorithmCode(k.handle, c);
       setNativeKbdVibrator(k.handle, 1);
       setNativeKbdVibrator(k.handle, -7);
       setNativeAppPlat(k.handle, JvmSuite.encModulusHex, false);

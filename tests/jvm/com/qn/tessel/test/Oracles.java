@@ -1,17 +1,21 @@
 package com.qn.tessel.test;
 
-import java.io.ByteArrayOutputStream;
 import java.math.BigInteger;
 import java.nio.charset.StandardCharsets;
+import java.security.KeyFactory;
 import java.security.MessageDigest;
 import java.security.PrivateKey;
 import java.security.interfaces.RSAPublicKey;
+import java.security.spec.RSAPublicKeySpec;
+import java.util.Arrays;
 import java.util.Base64;
 import java.util.Locale;
+import javax.crypto.Cipher;
+import javax.crypto.spec.SecretKeySpec;
 
 /**
- * Independent answers computed by the JVM alone (its MessageDigest, its BigInteger, a few lines
- * of RC4 written from the published algorithm), to compare with what the library returns.
+ * Independent answers computed by the JVM alone (its MessageDigest, its RC4 cipher, its RSA key
+ * encoding), to compare with what the library returns.
  */
 final class Oracles {
   private Oracles() {}
@@ -40,70 +44,38 @@ final class Oracles {
     return mode == 'S' ? h2.substring(8, 24) : h2;
   }
 
-  /** RC4 (no keystream dropped) of data under key. */
-  static byte[] rc4(byte[] key, byte[] data) {
-    int[] s = new int[256];
-    for (int i = 0; i < 256; ++i) s[i] = i;
-    for (int i = 0, j = 0; i < 256; ++i) {
-      j = (j + s[i] + (key[i % key.length] & 0xff)) & 0xff;
-      int t = s[i];
-      s[i] = s[j];
-      s[j] = t;
-    }
-    byte[] out = new byte[data.length];
-    for (int k = 0, i = 0, j = 0; k < data.length; ++k) {
-      i = (i + 1) & 0xff;
-      j = (j + s[i]) & 0xff;
-      int t = s[i];
-      s[i] = s[j];
-      s[j] = t;
-      out[k] = (byte) (data[k] ^ s[(s[i] + s[j]) & 0xff]);
-    }
-    return out;
-  }
-
   /** getNativeEncryptedPinCode's value for a challenge and a typed text: base64(RC4(SHA-1(challenge), text)). */
   static byte[] encryptedPinCode(byte[] challenge, String text) throws Exception {
-    byte[] key = digest("SHA-1", challenge);
-    return ascii(Base64.getEncoder().encodeToString(rc4(key, ascii(text))));
+    Cipher rc4 = Cipher.getInstance("ARCFOUR");  // RC4, no keystream dropped
+    rc4.init(Cipher.ENCRYPT_MODE, new SecretKeySpec(digest("SHA-1", challenge), "ARCFOUR"));
+    return ascii(Base64.getEncoder().encodeToString(rc4.doFinal(ascii(text))));
   }
 
   static String modulusHex(RSAPublicKey key) {
     return key.getModulus().toString(16).toUpperCase(Locale.ROOT);
   }
 
-  private static void derLength(ByteArrayOutputStream out, int n) {
-    if (n < 0x80) {
-      out.write(n);
-    } else if (n < 0x100) {
-      out.write(0x81);
-      out.write(n);
-    } else {
-      out.write(0x82);
-      out.write(n >> 8);
-      out.write(n & 0xff);
+  /** Where the content of the DER element at `at` starts, and where the element ends. */
+  private static int[] element(byte[] der, int at) {
+    int length = der[at + 1] & 0xff;
+    int start = at + 2;
+    if (length >= 0x80) {
+      int count = length & 0x7f;
+      length = 0;
+      for (int k = 0; k < count; ++k) length = (length << 8) | (der[start++] & 0xff);
     }
+    return new int[] {start, start + length};
   }
 
-  private static byte[] derInteger(BigInteger v) {
-    byte[] body = v.toByteArray();  // two's complement: a leading 00 when the top bit is set
-    ByteArrayOutputStream out = new ByteArrayOutputStream();
-    out.write(0x02);
-    derLength(out, body.length);
-    out.write(body, 0, body.length);
-    return out.toByteArray();
-  }
-
-  /** DER of SEQUENCE { INTEGER modulus, INTEGER exponent } (PKCS#1 RSAPublicKey). */
-  static byte[] rsaPublicKeyDer(BigInteger modulus, BigInteger exponent) {
-    byte[] n = derInteger(modulus);
-    byte[] e = derInteger(exponent);
-    ByteArrayOutputStream out = new ByteArrayOutputStream();
-    out.write(0x30);
-    derLength(out, n.length + e.length);
-    out.write(n, 0, n.length);
-    out.write(e, 0, e.length);
-    return out.toByteArray();
+  /**
+   * DER of SEQUENCE { INTEGER modulus, INTEGER exponent } (PKCS#1 RSAPublicKey), as the JDK
+   * encodes it inside the BIT STRING of a SubjectPublicKeyInfo.
+   */
+  static byte[] rsaPublicKeyDer(BigInteger modulus, BigInteger exponent) throws Exception {
+    byte[] spki = KeyFactory.getInstance("RSA").generatePublic(new RSAPublicKeySpec(modulus, exponent)).getEncoded();
+    int algorithm = element(spki, 0)[0];
+    int bitString = element(spki, algorithm)[1];
+    return Arrays.copyOfRange(spki, element(spki, bitString)[0] + 1, spki.length);  // after the unused-bits byte
   }
 
   /** A key blob as the blob setters read it: a 20-byte header, then the given bytes reversed. */

@@ -89,13 +89,6 @@ final class OutputTests {
       Check.isNull(getNativePinContent(k.handle, TIMESTAMP), "no key after a refused DER");
       Check.equal("The encryption platform modulus is missing!", getNativeLastError(k.handle), "error");
       Check.equal(1, setNativePublicKeyModulus(k.handle, JvmSuite.encModulusHex), "modulus again");
-      Check.equal(1, setNativePublicKeyBlob(k.handle, Oracles.hex(Oracles.keyBlob(new byte[] {1, 2, 3}), true)),
-          "blob whose key is not DER (still 1)");
-      Check.isNull(getNativePinContent(k.handle, TIMESTAMP), "no key after a refused blob");
-      Check.equal(1, setNativePublicKeyModulus(k.handle, JvmSuite.encModulusHex), "modulus again");
-      Check.equal(1, setNativePublicKeyBlob(k.handle, "12G4"), "blob of bad hex (still 1)");
-      Check.isNull(getNativePinContent(k.handle, TIMESTAMP), "no key after an unreadable blob");
-      Check.equal(1, setNativePublicKeyModulus(k.handle, JvmSuite.encModulusHex), "modulus again");
       Check.equal("Pin 2468", pinContent(k), "opened (modulus)");
       // The content output keeps using the built-in key whatever the encryption key is.
       Check.equal("Pin 2468", serverContent(k.handle), "content (type 48) unaffected");
@@ -155,10 +148,7 @@ final class OutputTests {
     Check.test("degree letters of typed texts", () -> {
       JvmSuite.destroyAll();
       KeyboardDriver k = keyboard(gl, "degree");
-      final String[][] table = {  // text, letter (rule set 48)
-        {"", "E"}, {"12345", "W"}, {"123456", "W"}, {"abcdef", "W"}, {"abc123", "M"}, {"aaaa12", "W"},
-        {"ab1!cd", "S"}, {"Tessel 7!", "S"},
-      };
+      final String[][] table = {{"", "E"}, {"123456", "W"}, {"abc123", "M"}, {"Tessel 7!", "S"}};  // rule set 48
       for (String[] row : table) {
         clearNativePlaintext(k.handle);
         k.type(row[0]);

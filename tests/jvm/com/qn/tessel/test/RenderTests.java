@@ -7,17 +7,15 @@ import static com.qn.tessel.test.JvmSuite.keyboard;
 
 import java.awt.image.BufferedImage;
 import java.io.File;
-import java.util.HashSet;
-import java.util.Set;
 import javax.imageio.ImageIO;
 
 /**
  * The three GL surfaces driven from Java as an app's renderers drive them: each on its own
  * thread with its own offscreen GLES 1.1 context (Mesa), the touches on the main thread, and
- * the frames read back with glReadPixels. The pictures themselves are the renderer's business;
- * these cases check what the managed side can rely on: keys are drawn where the touch grid puts
- * them, a held key shows, the kbdMode and popMode settings hide what they should, and the
- * pop-up surfaces show the field dots and the held top-row key.
+ * the frames read back with glReadPixels. The pictures themselves are checked pixel by pixel in
+ * the C++ render suite; these cases check what the managed side can rely on: every draw entry
+ * point draws, a held key shows, the kbdMode, popMode, keyboard type and surface variant settings
+ * reach the renderer, and the pop-up surfaces show the field dots and the held top-row key.
  */
 final class RenderTests {
   private RenderTests() {}
@@ -57,14 +55,6 @@ final class RenderTests {
       return differing(other, 0, 0, width, height);
     }
 
-    int distinctColours() {
-      Set<Integer> colours = new HashSet<>();
-      for (int y = 0; y < height; ++y) {
-        for (int x = 0; x < width; ++x) colours.add(pixel(x, y));
-      }
-      return colours.size();
-    }
-
     /** Saves the frame as a PNG next to the suite's other outputs, for a person to look at. */
     void save(String name) throws Exception {
       BufferedImage image = new BufferedImage(width, height, BufferedImage.TYPE_INT_ARGB);
@@ -100,25 +90,12 @@ final class RenderTests {
   }
 
   private static void mainSurface(EglContext gl) throws Exception {
-    Check.test("keyboard surface: keys are drawn on the touch grid", () -> {
+    Check.test("keyboard surface: held key, balloon, pop mode, kbd mode, number pad, variant 0", () -> {
       JvmSuite.destroyAll();
       KeyboardDriver k = keyboard(gl, "render");
       final int h = k.handle;
       Frame idle = draw(gl, () -> setNativeDrawFrame(h));
       idle.save("jvm_keyboard_idle");
-      Check.isTrue(idle.distinctColours() > 16, "a picture, not a flat fill: " + idle.distinctColours() + " colours");
-      Check.equal(0, idle.differing(draw(gl, () -> setNativeDrawFrame(h))), "the same state draws the same frame");
-      // Each row-0 key face against the gap between two keys, low in the key (below the glyph).
-      int differ = 0;
-      for (int p = 0; p < 10; ++p) {
-        double[] c = k.positionCentre(p);
-        double y = c[1] + 0.3 * k.kh;
-        if (idle.pixel(c[0], y) != idle.pixel((p + 1) * k.kw, y) || idle.pixel(c[0], y) != idle.pixel(p * k.kw, y)) {
-          ++differ;
-        }
-      }
-      Check.equal(10, differ, "row-0 key faces differ from the gaps beside them");
-
       // Holding a key: its held face (and, in variant 1 with pop mode on, its balloon).
       double[] q = k.positionCentre(12);  // row 1
       Check.equal(-1, setNativeTouchPos(h, TOUCH_DOWN, (float) q[0], (float) q[1]), "hold position 12");

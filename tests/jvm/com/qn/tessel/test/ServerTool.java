@@ -1,7 +1,5 @@
 package com.qn.tessel.test;
 
-import java.io.ByteArrayOutputStream;
-import java.io.InputStream;
 import java.nio.charset.StandardCharsets;
 import java.util.ArrayList;
 import java.util.HashMap;
@@ -38,13 +36,6 @@ final class ServerTool {
     }
   }
 
-  private static String drain(InputStream in) throws Exception {
-    ByteArrayOutputStream out = new ByteArrayOutputStream();
-    byte[] buf = new byte[4096];
-    for (int n; (n = in.read(buf)) > 0; ) out.write(buf, 0, n);
-    return new String(out.toByteArray(), StandardCharsets.UTF_8);
-  }
-
   Result open(int type, String output, String encKeyPem) throws Exception {
     List<String> cmd = new ArrayList<>();
     cmd.add(executable);
@@ -61,8 +52,8 @@ final class ServerTool {
     p.getOutputStream().write(output.getBytes(StandardCharsets.ISO_8859_1));
     p.getOutputStream().close();
     Result r = new Result();
-    String stdout = drain(p.getInputStream());
-    r.stderr = drain(p.getErrorStream());
+    String stdout = new String(p.getInputStream().readAllBytes(), StandardCharsets.UTF_8);
+    r.stderr = new String(p.getErrorStream().readAllBytes(), StandardCharsets.UTF_8);
     if (!p.waitFor(60, TimeUnit.SECONDS)) {
       p.destroyForcibly();
       throw new IllegalStateException("tessel_open did not finish");
