@@ -1,7 +1,8 @@
 #!/usr/bin/env bash
-# Builds and runs every test: the release build with warnings as errors, then the whole suite
-# again under AddressSanitizer + UndefinedBehaviorSanitizer, a libFuzzer smoke run and the
-# thread stress suite under ThreadSanitizer. Exits non-zero on any failure.
+# Builds and runs every test: the release build with warnings as errors (unit, JVM, GL and
+# window suites), the thread stress suite under ThreadSanitizer, a libFuzzer smoke run, and the
+# whole unit suite again under AddressSanitizer + UndefinedBehaviorSanitizer.
+# Exits non-zero on any failure.
 set -euo pipefail
 cd "$(dirname "${BASH_SOURCE[0]}")/.."
 bash tools/setup/setup.sh
@@ -12,17 +13,18 @@ cmake -S . -B build -G Ninja -DCMAKE_BUILD_TYPE=Release -DTESSEL_WERROR=ON >/dev
 cmake --build build -j"$jobs"
 ctest --test-dir build --output-on-failure -j"$jobs"
 
+echo "== ThreadSanitizer: the UI/GL thread stress suite"
+bash tools/run_tsan.sh
+
+echo "== libFuzzer smoke run (clang, ASan+UBSan, about 12 s per target on fuzz/corpus)"
+bash tools/run_fuzz.sh smoke
+
 echo "== AddressSanitizer + UndefinedBehaviorSanitizer build and tests"
-# Suites labelled nosan (those that load the library into a JVM) run in the release pass only.
+# Suites labelled nosan (the allocator-wrapping hygiene suite, the window demo) run in the
+# release pass only.
 cmake -S . -B build-asan -G Ninja -DCMAKE_BUILD_TYPE=RelWithDebInfo -DTESSEL_WERROR=ON \
       -DTESSEL_SANITIZE=address,undefined >/dev/null
 cmake --build build-asan -j"$jobs"
 ASAN_OPTIONS=detect_leaks=1:strict_string_checks=1 UBSAN_OPTIONS=print_stacktrace=1 \
   LSAN_OPTIONS=suppressions="$PWD/tests/lsan.supp":print_suppressions=0 \
   ctest --test-dir build-asan --output-on-failure -j"$jobs" -LE nosan
-
-echo "== libFuzzer smoke run (clang, ASan+UBSan, about 12 s per target on fuzz/corpus)"
-bash tools/run_fuzz.sh smoke
-
-echo "== ThreadSanitizer: the UI/GL thread stress suite"
-bash tools/run_tsan.sh
