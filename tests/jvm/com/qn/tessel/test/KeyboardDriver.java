@@ -90,32 +90,15 @@ final class KeyboardDriver {
       Check.equal(0, spaceKey(), "space key");
       return;
     }
-    int position;
-    boolean wantSymbols;
-    Boolean wantShift;  // null: either
-    if (c >= 'a' && c <= 'z') {
-      position = find(LETTERS, c);
-      wantSymbols = false;
-      wantShift = false;
-    } else if (c >= 'A' && c <= 'Z') {
-      position = find(LETTERS, Character.toLowerCase(c));
-      wantSymbols = false;
-      wantShift = true;
-    } else if (c >= '0' && c <= '9') {
-      position = find(SYMBOLS, c);
-      wantSymbols = true;
-      wantShift = null;
-    } else if (find(SYMBOLS, c) >= 0) {
-      position = find(SYMBOLS, c);
-      wantSymbols = true;
-      wantShift = false;
-    } else {
-      position = find(SYMBOLS_SHIFTED, c);
-      wantSymbols = true;
-      wantShift = true;
-    }
+    int letter = find(LETTERS, Character.toLowerCase(c));
+    int symbol = find(SYMBOLS, c);
+    int shifted = find(SYMBOLS_SHIFTED, c);
+    int position = letter >= 0 ? letter : symbol >= 0 ? symbol : shifted;
     if (position < 0) throw new IllegalArgumentException("no key for " + c);
-    if (symbolPage != wantSymbols) Check.equal(0, switchKey(), "switch key");
+    // Digits are on both symbol pages: either shift state will do.
+    Boolean wantShift = letter >= 0 ? Boolean.valueOf(Character.isUpperCase(c))
+        : symbol >= 0 && shifted >= 0 ? null : Boolean.valueOf(shifted >= 0);
+    if (symbolPage != (letter < 0)) Check.equal(0, switchKey(), "switch key");
     if (wantShift != null && shift != wantShift) Check.equal(0, shiftKey(), "shift key");
     Check.equal(0, tapPosition(position), "key '" + c + "'");
   }
