@@ -48,26 +48,14 @@ final class Check {
     if (expected != actual) fail(what + ": expected " + expected + ", got " + actual);
   }
 
+  /** Objects, or byte arrays by content. */
   static void equal(Object expected, Object actual, String what) {
     ++checks;
-    if (!Objects.equals(expected, actual)) fail(what + ": expected <" + expected + ">, got <" + actual + ">");
-  }
-
-  static void equalBytes(byte[] expected, byte[] actual, String what) {
-    ++checks;
-    if (!Arrays.equals(expected, actual)) {
-      fail(what + ": expected " + Arrays.toString(expected) + ", got " + Arrays.toString(actual));
+    if (expected instanceof byte[] && actual instanceof byte[]) {
+      expected = Arrays.toString((byte[]) expected);
+      actual = Arrays.toString((byte[]) actual);
     }
-  }
-
-  static void isNull(Object value, String what) {
-    ++checks;
-    if (value != null) fail(what + ": expected null, got <" + value + ">");
-  }
-
-  static void notNull(Object value, String what) {
-    ++checks;
-    if (value == null) fail(what + ": expected a value, got null");
+    if (!Objects.equals(expected, actual)) fail(what + ": expected <" + expected + ">, got <" + actual + ">");
   }
 
   static int failures() {

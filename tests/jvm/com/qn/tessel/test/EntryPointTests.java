@@ -18,19 +18,7 @@ final class EntryPointTests {
   }
 
   /** One method: what it returns for a negative handle and for a non-negative one without a session. */
-  static final class Row {
-    final String name;
-    final Call call;
-    final Object negative;
-    final Object noSession;
-
-    Row(String name, Object negative, Object noSession, Call call) {
-      this.name = name;
-      this.call = call;
-      this.negative = negative;
-      this.noSession = noSession;
-    }
-  }
+  record Row(String name, Object negative, Object noSession, Call call) {}
 
   static Row row(String name, Object refused, Call call) {
     return new Row(name, refused, refused, call);
@@ -104,8 +92,8 @@ final class EntryPointTests {
       final int[] handles = {-1, -20, Integer.MIN_VALUE, 0, 19, 20, 1000, Integer.MAX_VALUE};
       for (int h : handles) {
         for (Row r : rows()) {
-          Object got = r.call.call(h);
-          Check.equal(h < 0 ? r.negative : r.noSession, got, r.name + "(" + h + ")");
+          Object got = r.call().call(h);
+          Check.equal(h < 0 ? r.negative() : r.noSession(), got, r.name() + "(" + h + ")");
         }
       }
       // Nothing above may have brought a session to life.
@@ -136,10 +124,10 @@ final class EntryPointTests {
       setNativeHashRandom(h, null);
       setNativeDictionaryFilter(h, null);
       setNativeChallengeCode(h, null);
-      Check.isNull(getNativePinContent(h, null), "getNativePinContent(null timestamp)");
-      Check.isNull(getNativeContent(h, null), "getNativeContent(null timestamp)");
+      Check.equal(null, getNativePinContent(h, null), "getNativePinContent(null timestamp)");
+      Check.equal(null, getNativeContent(h, null), "getNativeContent(null timestamp)");
       Check.equal("The timestamp is missing!", getNativeLastError(h), "last error after a null timestamp");
-      Check.isNull(getNativeEncryptedPinCode(h), "no challenge code after setNativeChallengeCode(null)");
+      Check.equal(null, getNativeEncryptedPinCode(h), "no challenge code after setNativeChallengeCode(null)");
       Check.equal("Challenge code is empty", getNativeLastError(h), "last error without a challenge code");
       // The session is still whole: an empty content rates 'E' and verifies as empty.
       Check.equal((short) 'E', getNativeDegree(h), "degree of the empty content");

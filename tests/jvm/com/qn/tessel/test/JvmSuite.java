@@ -96,7 +96,7 @@ public final class JvmSuite {
     setUp();
     Check.test("the class reaches the library loaded by the test", () -> {
       Check.isTrue(QNKbdJniLib.isAvailable(), "isAvailable");
-      Check.notNull(QNKbdJniLib.libraryLoadFailure(), "the class's own loadLibrary failed as expected");
+      Check.isTrue(QNKbdJniLib.libraryLoadFailure() != null, "the class's own loadLibrary failed as expected");
     });
     EntryPointTests.run();
     KeyboardTests.run();

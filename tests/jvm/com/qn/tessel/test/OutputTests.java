@@ -44,16 +44,16 @@ final class OutputTests {
       Check.equal("No Error!", getNativeLastError(k.handle), "before any output");
       k.type("ab1!cd");
       String out = getNativeContent(k.handle, TIMESTAMP);
-      Check.notNull(out, "getNativeContent");
+      Check.isTrue(out != null, "getNativeContent");
       ServerTool.Result r = JvmSuite.server.open(48, out, null);
       Check.equal(0, r.exitCode, "opened " + r);
       Check.equal("S", r.get("strength"), "strength letter");
       Check.equal("ab1!cd", r.get("content"), "content");
       Check.equal("No Error!", getNativeLastError(k.handle), "after a success");
       Check.isTrue(!out.equals(getNativeContent(k.handle, TIMESTAMP)), "a fresh session key every call");
-      Check.isNull(getNativeContent(k.handle, null), "no timestamp");
+      Check.equal(null, getNativeContent(k.handle, null), "no timestamp");
       Check.equal("The timestamp is missing!", getNativeLastError(k.handle), "its error");
-      Check.isNull(getNativePinContent(k.handle, TIMESTAMP), "PIN content without an encryption key");
+      Check.equal(null, getNativePinContent(k.handle, TIMESTAMP), "PIN content without an encryption key");
       Check.equal("The encryption platform modulus is missing!", getNativeLastError(k.handle), "its error");
       Check.equal(6, getNativeContentLen(k.handle), "outputs leave the text in place");
       Check.equal("ab1!cd", serverContent(k.handle), "and readable again");
@@ -86,7 +86,7 @@ final class OutputTests {
       // Keys that are refused clear the field: the PIN content then fails.
       String exponent3 = Oracles.hex(Oracles.rsaPublicKeyDer(n, BigInteger.valueOf(3)), true);
       Check.equal(1, setNativePublicKeyDER(k.handle, exponent3), "DER with exponent 3 (still 1)");
-      Check.isNull(getNativePinContent(k.handle, TIMESTAMP), "no key after a refused DER");
+      Check.equal(null, getNativePinContent(k.handle, TIMESTAMP), "no key after a refused DER");
       Check.equal("The encryption platform modulus is missing!", getNativeLastError(k.handle), "error");
       Check.equal(1, setNativePublicKeyModulus(k.handle, JvmSuite.encModulusHex), "modulus again");
       Check.equal("Pin 2468", pinContent(k), "opened (modulus)");
@@ -110,7 +110,7 @@ final class OutputTests {
       Check.equal(1, setNativePublicKeyModulus(k.handle, JvmSuite.encModulusHex), "encryption key");
       Check.equal(Oracles.saltedHash("secret9", "salt:with:colons", 'F'), pinContent(k), "PIN content, hashed");
       clearNativePlaintext(k.handle);
-      Check.isNull(getNativeContent(k.handle, TIMESTAMP), "an empty password cannot be hashed");
+      Check.equal(null, getNativeContent(k.handle, TIMESTAMP), "an empty password cannot be hashed");
       Check.equal("The format of the text is wrong!", getNativeLastError(k.handle), "its error");
       destroyNativeSession(k.handle);
     });
@@ -118,27 +118,27 @@ final class OutputTests {
     Check.test("encrypted PIN code is RC4 under SHA-1 of the challenge", () -> {
       JvmSuite.destroyAll();
       KeyboardDriver k = keyboard(gl, "pincode");
-      Check.isNull(getNativeEncryptedPinCode(k.handle), "no challenge code");
+      Check.equal(null, getNativeEncryptedPinCode(k.handle), "no challenge code");
       Check.equal("Challenge code is empty", getNativeLastError(k.handle), "its error");
       byte[] challenge = Oracles.ascii("challenge-4711");
       setNativeChallengeCode(k.handle, challenge);
-      Check.isNull(getNativeEncryptedPinCode(k.handle), "no text typed");
+      Check.equal(null, getNativeEncryptedPinCode(k.handle), "no text typed");
       Check.equal("Encryption error", getNativeLastError(k.handle), "its error");
       k.type("0815 pin");
-      Check.equalBytes(Oracles.encryptedPinCode(challenge, "0815 pin"), getNativeEncryptedPinCode(k.handle),
+      Check.equal(Oracles.encryptedPinCode(challenge, "0815 pin"), getNativeEncryptedPinCode(k.handle),
           "code");
       Check.equal("No Error!", getNativeLastError(k.handle), "after a success");
       setNativeChallengeCode(k.handle, new byte[0]);              // ignored
       setNativeChallengeCode(k.handle, new byte[] {0, 'x', 'y'});  // ignored: starts with zero
       setNativeChallengeCode(k.handle, null);                     // ignored
-      Check.equalBytes(Oracles.encryptedPinCode(challenge, "0815 pin"), getNativeEncryptedPinCode(k.handle),
+      Check.equal(Oracles.encryptedPinCode(challenge, "0815 pin"), getNativeEncryptedPinCode(k.handle),
           "the first challenge is kept");
       setNativeChallengeCode(k.handle, new byte[] {'a', 'b', 0, 'c'});
-      Check.equalBytes(Oracles.encryptedPinCode(Oracles.ascii("ab"), "0815 pin"), getNativeEncryptedPinCode(k.handle),
+      Check.equal(Oracles.encryptedPinCode(Oracles.ascii("ab"), "0815 pin"), getNativeEncryptedPinCode(k.handle),
           "a challenge ends at its first zero byte");
       byte[] high = {(byte) 0xC3, (byte) 0xA9, (byte) 0xFF, 0x7F};
       setNativeChallengeCode(k.handle, high);
-      Check.equalBytes(Oracles.encryptedPinCode(high, "0815 pin"), getNativeEncryptedPinCode(k.handle),
+      Check.equal(Oracles.encryptedPinCode(high, "0815 pin"), getNativeEncryptedPinCode(k.handle),
           "bytes above 0x7F are taken as they are");
       byte[] code = getNativeEncryptedPinCode(k.handle);
       Check.isTrue(code != null && code[code.length - 1] != 0, "no terminator in the array");

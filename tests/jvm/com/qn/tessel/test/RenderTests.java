@@ -21,17 +21,7 @@ final class RenderTests {
   private RenderTests() {}
 
   /** A frame read back top row first, with pixel access in the app's touch coordinates. */
-  static final class Frame {
-    final byte[] rgba;
-    final int width;
-    final int height;
-
-    Frame(byte[] rgba, int width, int height) {
-      this.rgba = rgba;
-      this.width = width;
-      this.height = height;
-    }
-
+  record Frame(byte[] rgba, int width, int height) {
     int pixel(double x, double y) {
       int px = Math.min(width - 1, Math.max(0, (int) x));
       int py = Math.min(height - 1, Math.max(0, (int) y));
