@@ -3,12 +3,11 @@
 // PKCS#1 v1.5 type 2 is a deterministic known-answer test: the RSA Laboratories vectors give
 // the random seed of each example, fed through setRandomSourceForTesting, so padding plus our
 // RSA must reproduce each published ciphertext exactly (300 examples, 1024 to 2048 bits).
-// The other layouts are checked field by field, and through OpenSSL's private key where a
+// The other layouts are checked byte for byte, and through OpenSSL's private key where a
 // receiver would open them.
 #include <gtest/gtest.h>
 
 #include <algorithm>
-#include <cctype>
 #include <cstring>
 #include <string>
 
@@ -16,7 +15,7 @@
 #include "crypto/padding.h"
 #include "crypto/random.h"
 #include "crypto/rsa.h"
-#include "support/rsa_oracle.h"
+#include "support/dispatch_oracle.h"
 #include "support/vector_file.h"
 
 namespace tessel {
@@ -24,6 +23,7 @@ namespace {
 
 using test::Bytes;
 using test::toHex;
+using Padder = SecureBuffer (*)(const std::uint8_t*, std::size_t, std::size_t) noexcept;
 
 // The scripted random source: replays `g_script` (cycled), counts calls, can fail.
 Bytes g_script;
@@ -32,28 +32,21 @@ bool g_fail = false;
 
 bool scriptedSource(std::uint8_t* buffer, std::size_t n) {
   ++g_calls;
-  if (g_fail) return false;
   for (std::size_t i = 0; i < n; ++i) buffer[i] = g_script.empty() ? 0 : g_script[i % g_script.size()];
-  return true;
+  return !g_fail;
 }
 
 class Padding : public ::testing::Test {
  protected:
-  void SetUp() override {
-    g_script = {0x5A};
-    g_calls = 0;
-    g_fail = false;
-    setRandomSourceForTesting(scriptedSource);
-  }
+  void SetUp() override { setRandomSourceForTesting(scriptedSource); }
   void TearDown() override { setRandomSourceForTesting(nullptr); }
 };
 
-Bytes bytes(const SecureBuffer& b) { return b ? Bytes(b.data(), b.data() + b.size()) : Bytes{}; }
-
-std::string toHexUpper(const Bytes& b) {
-  std::string s = toHex(b);
-  for (auto& c : s) c = static_cast<char>(std::toupper(static_cast<unsigned char>(c)));
-  return s;
+std::string hexOf(const SecureBuffer& b) { return b ? toHex(Bytes(b.data(), b.data() + b.size())) : "<absent>"; }
+// Our RSA over a padded block, as upper-case hex.
+std::string rsa(const std::string& modulus, const SecureBuffer& block) {
+  const SecureBuffer c = rsaPublicHex(modulus.c_str(), hexEncode(block.data(), block.size()).c_str());
+  return c ? std::string(c.c_str()) : "<absent>";
 }
 
 TEST_F(Padding, Pkcs1KnownAnswersFromPublishedSeeds) {
@@ -63,158 +56,108 @@ TEST_F(Padding, Pkcs1KnownAnswersFromPublishedSeeds) {
     const std::size_t k = rsaModulusBytes(e.modulusHex.c_str());
     ASSERT_EQ(e.seed.size(), k - e.message.size() - 3) << e.name;
     g_script = e.seed;
-    const SecureBuffer block = pkcs1Type2Block(e.message.data(), e.message.size(), k);
-    ASSERT_TRUE(block) << e.name;
-    const SecureBuffer blockHex = hexEncode(block.data(), block.size());
-    const SecureBuffer c = rsaPublicHex(e.modulusHex.c_str(), blockHex.c_str());
-    ASSERT_TRUE(c) << e.name;
-    EXPECT_EQ(std::string(c.c_str()), toHexUpper(e.ciphertext)) << "example " << e.name;
+    EXPECT_EQ(test::fromHex(rsa(e.modulusHex, pkcs1Type2Block(e.message.data(), e.message.size(), k))), e.ciphertext)
+        << e.name;
   }
 }
 
-TEST_F(Padding, Pkcs1Layout) {
-  const Bytes m = test::bytesOf("hello");
-  g_script = {0x00, 0x07, 0x00};  // zero filler bytes become 0x01, not a second draw
-  const Bytes b = bytes(pkcs1Type2Block(m.data(), m.size(), 20));
-  ASSERT_EQ(b.size(), 20u);
-  EXPECT_EQ(toHex(b), "0002" "010701010701010701010701" "00" "68656c6c6f");
-  EXPECT_EQ(g_calls, 1);
-}
-
-TEST_F(Padding, Pkcs1Bounds) {
-  const Bytes m(118, 0x33);
-  EXPECT_EQ(bytes(pkcs1Type2Block(m.data(), 117, 128)).size(), 128u);
-  EXPECT_FALSE(pkcs1Type2Block(m.data(), 118, 128));
-  EXPECT_FALSE(pkcs1Type2Block(m.data(), 0, 128));
-  EXPECT_FALSE(pkcs1Type2Block(nullptr, 5, 128));
-  EXPECT_FALSE(pkcs1Type2Block(m.data(), 1, 11));
-  EXPECT_TRUE(pkcs1Type2Block(m.data(), 1, 12));
-  EXPECT_FALSE(pkcs1Type2Block(m.data(), 1, 0));
+TEST_F(Padding, LayoutsAndBounds) {
+  const Bytes x(300, 'x'), dead = {0xDE, 0xAD}, ab = {0xAB};
+  auto rep = [](std::size_t n, const std::string& hex) {
+    std::string s;
+    while (n--) s += hex;
+    return s;
+  };
+  const struct {
+    const char* name;
+    Padder pad;
+    const std::uint8_t* m;
+    std::size_t mlen, k;
+    Bytes script;
+    std::string block;  // "<absent>" when refused
+    int calls;          // random requests (-1: not checked)
+  } cases[] = {
+      // Zero filler bytes become 0x01, not a second draw.
+      {"PKCS#1", pkcs1Type2Block, x.data(), 5, 20, {0x00, 0x07, 0x00}, "0002" + rep(4, "010701") + "00" + rep(5, "78"),
+       1},
+      {"PKCS#1 11 bytes of overhead", pkcs1Type2Block, x.data(), 117, 128, {0x5A},
+       "0002" + rep(8, "5a") + "00" + rep(117, "78"), 1},
+      {"PKCS#1 message too long", pkcs1Type2Block, x.data(), 118, 128, {}, "<absent>", -1},
+      {"PKCS#1 empty", pkcs1Type2Block, x.data(), 0, 128, {}, "<absent>", -1},
+      {"PKCS#1 null", pkcs1Type2Block, nullptr, 5, 128, {}, "<absent>", -1},
+      {"PKCS#1 k = 11", pkcs1Type2Block, x.data(), 1, 11, {}, "<absent>", -1},
+      {"PKCS#1 k = 0", pkcs1Type2Block, x.data(), 1, 0, {}, "<absent>", -1},
+      {"PKCS#1 k = 12", pkcs1Type2Block, ab.data(), 1, 12, {0x00}, "0002" + rep(8, "01") + "00ab", 1},
+      {"Keyou", keyouBlock, x.data(), 40, 128, {0x00, 0x9C}, "3430" + rep(40, "78") + rep(43, "019c"), 1},
+      {"Keyou one byte", keyouBlock, ab.data(), 1, 4, {0x00}, "3031ab01", 1},
+      // Lengths past 99 run past '9' in the tens character: ';' for 117, kept as it stands.
+      {"Keyou 117", keyouBlock, x.data(), 117, 128, {0x5A}, "3b37" + rep(117, "78") + rep(9, "5a"), 1},
+      {"Keyou fills the block, no filler drawn", keyouBlock, x.data(), 126, 128, {}, "3c36" + rep(126, "78"), 0},
+      {"Keyou m + 2 > k", keyouBlock, x.data(), 127, 128, {}, "<absent>", -1},
+      {"Keyou empty", keyouBlock, x.data(), 0, 128, {}, "<absent>", -1},
+      {"Keyou null", keyouBlock, nullptr, 3, 128, {}, "<absent>", -1},
+      {"Keyou binary", keyouBinaryBlock, dead.data(), 2, 6, {0x00}, "0002dead0101", 1},
+      {"Keyou binary too long", keyouBinaryBlock, dead.data(), 2, 3, {}, "<absent>", -1},
+      {"Keyou binary length above its byte", keyouBinaryBlock, x.data(), 256, 280, {}, "<absent>", -1},
+      {"length byte, FF fill", lengthByteFfBlock, dead.data(), 2, 6, {}, "02deadffffff", 0},
+      {"length byte, no fill", lengthByteFfBlock, dead.data(), 2, 3, {}, "02dead", 0},
+      {"length byte, empty", lengthByteFfBlock, dead.data(), 0, 3, {}, "00ffff", 0},
+      {"length byte, too long", lengthByteFfBlock, dead.data(), 2, 2, {}, "<absent>", -1},
+      {"length byte, null", lengthByteFfBlock, nullptr, 2, 6, {}, "<absent>", -1},
+  };
+  for (const auto& c : cases) {
+    g_script = c.script;
+    g_calls = 0;
+    EXPECT_EQ(hexOf(c.pad(c.m, c.mlen, c.k)), c.block) << c.name;
+    if (c.calls >= 0) { EXPECT_EQ(g_calls, c.calls) << c.name; }
+  }
   g_fail = true;
-  EXPECT_FALSE(pkcs1Type2Block(m.data(), 5, 128)) << "random source failure";
+  EXPECT_FALSE(pkcs1Type2Block(x.data(), 5, 128)) << "random source failure";
+  EXPECT_FALSE(keyouBlock(x.data(), 10, 128)) << "random source failure";
+  g_fail = false;
 }
 
-TEST_F(Padding, Pkcs1OpensWithOpenSsl) {
-  setRandomSourceForTesting(nullptr);  // real randomness, real receiver
-  const auto key = test::RsaTestKey::generate(1024);
+TEST(PaddingReceiver, OpenSslPrivateKeyOpensPkcs1AndKeyouBlocks) {
+  // Real randomness, real receiver.
+  const auto& key = test::appKey();
   const Bytes m = test::bytesOf("0123456789abcdef");
   for (int i = 0; i < 10; ++i) {
-    const SecureBuffer block = pkcs1Type2Block(m.data(), m.size(), key.bytes());
-    const Bytes b = bytes(block);
-    EXPECT_EQ(std::count(b.begin() + 2, b.end() - static_cast<long>(m.size()) - 1, 0), 0);
-    const SecureBuffer hex = hexEncode(block.data(), block.size());
-    const SecureBuffer c = rsaPublicHex(key.modulusHex().c_str(), hex.c_str());
-    EXPECT_EQ(key.pkcs1Decrypt(test::fromHex(c.c_str())), m);
+    const SecureBuffer block = pkcs1Type2Block(m.data(), m.size(), key.size());
+    const Bytes b(block.data(), block.data() + block.size());
+    EXPECT_EQ(std::count(b.begin() + 2, b.end() - static_cast<long>(m.size()) - 1, 0), 0) << "zero in the filler";
+    EXPECT_EQ(test::opensslPkcs1Decrypt(key, test::fromHex(rsa(key.modulusHex(), block))), m);
   }
+  // A "Keyou" block starts with an ASCII digit, so it is below any full-width modulus.
+  const SecureBuffer block = keyouBlock(m.data(), 9, key.size());
+  const Bytes opened = test::opensslRawDecrypt(key, test::fromHex(rsa(key.modulusHex(), block)));
+  EXPECT_EQ(opened, Bytes(block.data(), block.data() + block.size()));
+  EXPECT_EQ(std::string(opened.begin(), opened.begin() + 11), "09012345678");
 }
 
-TEST_F(Padding, KeyouLayout) {
-  const Bytes m(40, 'x');
-  g_script = {0x00, 0x9C};
-  const Bytes b = bytes(keyouBlock(m.data(), m.size(), 128));
-  ASSERT_EQ(b.size(), 128u);
-  EXPECT_EQ(b[0], '4');
-  EXPECT_EQ(b[1], '0');
-  EXPECT_EQ(Bytes(b.begin() + 2, b.begin() + 42), m);
-  for (std::size_t i = 42; i < 128; ++i) EXPECT_EQ(b[i], (i - 42) % 2 ? 0x9C : 0x01) << i;
-
-  const Bytes one = {0xAB};
-  EXPECT_EQ(toHex(bytes(keyouBlock(one.data(), 1, 4))), "3031ab01");
-}
-
-TEST_F(Padding, KeyouLengthCharactersPast99) {
-  const Bytes m(117, 'y');
-  const Bytes b = bytes(keyouBlock(m.data(), m.size(), 128));
-  EXPECT_EQ(b[0], '0' + 11);  // ';' : kept as it stands
-  EXPECT_EQ(b[1], '7');
-}
-
-TEST_F(Padding, KeyouBounds) {
-  const Bytes m(130, 'z');
-  g_calls = 0;
-  const Bytes full = bytes(keyouBlock(m.data(), 126, 128));
-  ASSERT_EQ(full.size(), 128u) << "m = k - 2 fills the block exactly";
-  EXPECT_EQ(g_calls, 0) << "no filler, no random request";
-  EXPECT_FALSE(keyouBlock(m.data(), 127, 128)) << "m + 2 > k";
-  EXPECT_FALSE(keyouBlock(m.data(), 0, 128));
-  EXPECT_FALSE(keyouBlock(nullptr, 3, 128));
-  g_fail = true;
-  EXPECT_FALSE(keyouBlock(m.data(), 10, 128));
-}
-
-TEST_F(Padding, KeyouRoundTripThroughOpenSslKey) {
-  const auto key = test::RsaTestKey::generate(1024);
-  const Bytes m = test::bytesOf("password1");
-  const SecureBuffer block = keyouBlock(m.data(), m.size(), key.bytes());
-  const SecureBuffer hex = hexEncode(block.data(), block.size());
-  const SecureBuffer c = rsaPublicHex(key.modulusHex().c_str(), hex.c_str());
-  ASSERT_TRUE(c) << "the block starts with an ASCII digit, so it is below any full-width modulus";
-  const Bytes opened = key.rawDecrypt(test::fromHex(c.c_str()));
-  EXPECT_EQ(opened, bytes(block));
-  EXPECT_EQ(std::string(opened.begin() + 2, opened.begin() + 2 + (opened[0] - '0') * 10 + (opened[1] - '0')),
-            "password1");
-}
-
-TEST_F(Padding, KeyouBinaryAndFfFill) {
-  const Bytes m = {0xDE, 0xAD};
-  g_script = {0x00};
-  EXPECT_EQ(toHex(bytes(keyouBinaryBlock(m.data(), 2, 6))), "0002dead0101");
-  EXPECT_FALSE(keyouBinaryBlock(m.data(), 2, 3));
-  const Bytes big(300, 1);
-  EXPECT_FALSE(keyouBinaryBlock(big.data(), 256, 280)) << "the length must fit its byte";
-
-  EXPECT_EQ(toHex(bytes(lengthByteFfBlock(m.data(), 2, 6))), "02deadffffff");
-  EXPECT_EQ(toHex(bytes(lengthByteFfBlock(m.data(), 2, 3))), "02dead");
-  EXPECT_FALSE(lengthByteFfBlock(m.data(), 2, 2));
-  EXPECT_EQ(toHex(bytes(lengthByteFfBlock(m.data(), 0, 3))), "00ffff");
-  EXPECT_FALSE(lengthByteFfBlock(nullptr, 2, 6));
-}
-
-TEST(PinBlock, Iso9564Format0) {
-  struct Case {
-    const char* pin;
-    const char* pan;
-    const char* block;  // lower-case hex, "" = refused
+TEST(PinBlock, Iso9564Format0AndFPaddedDigits) {
+  const struct {
+    const char *pin, *pan;
+    const char* block;  // lower-case hex, "<absent>" = refused
   } cases[] = {
       {"1234", nullptr, "041234ffffffffff"},
       {"12345", nullptr, "0512345fffffffff"},
       {"123456789012", nullptr, "0c123456789012ff"},
-      {"1234", "4000001234567899", "041234fedcba9876"},   // account digits 000123456789
-      {"1234", "12", "041234fffffffffe"},                 // one digit left of the check digit
-      {"1234", "5", "041234ffffffffff"},                  // only a check digit: no account field
+      {"1234", "4000001234567899", "041234fedcba9876"},     // account digits 000123456789
+      {"1234", "12", "041234fffffffffe"},                   // one digit left of the check digit
+      {"1234", "5", "041234ffffffffff"},                    // only a check digit: no account field
       {"1234", "1234567890123456789", "04124c6fedcba987"},  // account digits 789012345678
-      {"123", nullptr, ""},
-      {"1234567890123", nullptr, ""},
-      {"12a4", nullptr, ""},
-      {"", nullptr, ""},
-      {"1234", "", ""},
-      {"1234", "40000012345678X9", ""},
-      {"1234 ", nullptr, ""},
+      {"123", nullptr, "<absent>"},           {"1234567890123", nullptr, "<absent>"},
+      {"12a4", nullptr, "<absent>"},          {"", nullptr, "<absent>"},
+      {"1234", "", "<absent>"},               {"1234", "40000012345678X9", "<absent>"},
+      {"1234 ", nullptr, "<absent>"},         {nullptr, nullptr, "<absent>"},
   };
-  for (const auto& c : cases) {
-    const SecureBuffer b = pinBlockX98(c.pin, c.pan);
-    EXPECT_EQ(b ? toHex(Bytes(b.data(), b.data() + b.size())) : std::string(), c.block)
-        << c.pin << " / " << (c.pan ? c.pan : "(no PAN)");
-  }
-  EXPECT_FALSE(pinBlockX98(nullptr, nullptr));
-}
-
-TEST(PinBlock, FPaddedDigits) {
-  struct Case {
-    const char* digits;
-    const char* block;
-  } cases[] = {{"", "ffffffffffffffff"},
-               {"1234", "1234ffffffffffff"},
-               {"123", "123fffffffffffff"},
-               {"123456789012", "123456789012ffff"},
-               {"1234567890123", ""},
-               {"12F4", ""},
-               {"-1", ""}};
-  for (const auto& c : cases) {
-    const SecureBuffer b = fPaddedDigitBlock(c.digits);
-    EXPECT_EQ(b ? toHex(Bytes(b.data(), b.data() + b.size())) : std::string(), c.block) << c.digits;
-  }
-  EXPECT_FALSE(fPaddedDigitBlock(nullptr));
+  for (const auto& c : cases)
+    EXPECT_EQ(hexOf(pinBlockX98(c.pin, c.pan)), c.block) << (c.pin ? c.pin : "null") << " / " << (c.pan ? c.pan : "-");
+  const std::pair<const char*, const char*> digits[] = {
+      {"", "ffffffffffffffff"},         {"1234", "1234ffffffffffff"}, {"123", "123fffffffffffff"},
+      {"123456789012", "123456789012ffff"}, {"1234567890123", "<absent>"}, {"12F4", "<absent>"},
+      {"-1", "<absent>"},               {nullptr, "<absent>"}};
+  for (const auto& [in, block] : digits) EXPECT_EQ(hexOf(fPaddedDigitBlock(in)), block) << (in ? in : "null");
 }
 
 }  // namespace

@@ -1,5 +1,6 @@
-// RC4 against RFC 6229's keystream vectors (seven key lengths, offsets 0..4096), which check
-// both the key schedule and rc4Discard, plus in-place operation.
+// RC4 against RFC 6229's keystream vectors (seven key lengths, offsets 0..4096, which check
+// both the key schedule and rc4Discard), and against OpenSSL for key lengths 1..256 and the
+// drops the envelope uses, in place and out of place.
 #include <gtest/gtest.h>
 
 #include <string>
@@ -12,40 +13,39 @@ namespace tessel {
 namespace {
 
 using test::Bytes;
-using test::fromHex;
-using test::toHex;
+
+Bytes rc4(const Bytes& key, std::size_t drop, const Bytes& data, bool inPlace) {
+  Rc4State s;
+  rc4Init(s, key.data(), key.size());
+  rc4Discard(s, drop);
+  Bytes out = inPlace ? data : Bytes(data.size());
+  rc4Crypt(s, inPlace ? out.data() : data.data(), out.data(), out.size());
+  wipeObject(s);
+  return out;
+}
 
 TEST(Rc4, Rfc6229Keystreams) {
   int checked = 0;
   for (const char* bits : {"40", "56", "64", "80", "128", "192", "256"}) {
     const std::string file = std::string("rfc-6229-") + bits + ".txt";
     for (const auto& r : test::readVectorRecords(test::dataPath(file))) {
-      const Bytes key = fromHex(r.at("KEY")), pt = fromHex(r.at("PLAINTEXT"));
-      Rc4State s;
-      rc4Init(s, key.data(), key.size());
-      rc4Discard(s, std::stoul(r.at("OFFSET")));
-      Bytes out = pt;
-      rc4Crypt(s, out.data(), out.data(), out.size());
-      EXPECT_EQ(toHex(out), r.at("CIPHERTEXT")) << file << " offset " << r.at("OFFSET");
-      wipeObject(s);
+      const Bytes key = test::fromHex(r.at("KEY")), plain = test::fromHex(r.at("PLAINTEXT"));
+      const Bytes out = rc4(key, std::stoul(r.at("OFFSET")), plain, true);
+      EXPECT_EQ(test::toHex(out), r.at("CIPHERTEXT")) << file << " offset " << r.at("OFFSET");
       ++checked;
     }
   }
   EXPECT_EQ(checked, 7 * 36);  // 18 offsets, 32 bytes each as two 16-byte rows
 }
 
-TEST(Rc4, DiscardEqualsEncryptingAndDroppingOutput) {
-  const Bytes key = fromHex("0102030405060708090a0b0c0d0e0f10");
-  Rc4State a, b;
-  rc4Init(a, key.data(), key.size());
-  rc4Init(b, key.data(), key.size());
-  Bytes junk(768);
-  rc4Crypt(a, junk.data(), junk.data(), junk.size());
-  rc4Discard(b, 768);
-  Bytes x(32), y(32);
-  rc4Crypt(a, x.data(), x.data(), x.size());
-  rc4Crypt(b, y.data(), y.data(), y.size());
-  EXPECT_EQ(x, y);
+TEST(Rc4, AgreesWithOpenSslForKeyLengthsAndDrops) {
+  for (std::size_t keyLength : {1u, 5u, 12u, 16u, 20u, 32u, 256u}) {
+    Bytes key(keyLength), data(700);
+    for (std::size_t k = 0; k < keyLength; ++k) key[k] = static_cast<std::uint8_t>(k * 37 + keyLength);
+    for (std::size_t k = 0; k < data.size(); ++k) data[k] = static_cast<std::uint8_t>(k);
+    for (std::size_t drop : {0u, 512u, 625u, 768u})
+      EXPECT_EQ(rc4(key, drop, data, false), test::opensslRc4(key, data, drop)) << keyLength << "/" << drop;
+  }
 }
 
 }  // namespace

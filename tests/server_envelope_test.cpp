@@ -11,62 +11,45 @@
 namespace tessel::test {
 namespace {
 
-using server::PrivateKey;
-
 const Bytes kRc4Key = fromHex("00112233445566778899aabbccddeeff");
 
 TEST(ServerEnvelope, OpensOpenSslEnvelopesAtEachDrop) {
-  for (std::size_t drop : {512u, 625u, 768u}) {
-    const std::string content = "S20240101:secret text";
+  for (const auto& [drop, content] : {std::pair{std::size_t{512}, std::string("S20240101:secret text")},
+                                      {std::size_t{625}, std::string("S20240101:secret text")},
+                                      {std::size_t{768}, std::string("S20240101:secret text")},
+                                      {std::size_t{512}, std::string()}}) {
     const std::string envelope = opensslEnvelope(appKey(), kRc4Key, drop, content);
-    std::string opened, error;
+    std::string opened = "x", error;
     ASSERT_TRUE(server::openEnvelope(envelope, appKey(), drop, &opened, &error)) << error;
     EXPECT_EQ(opened, content) << "drop " << drop;
     ASSERT_TRUE(server::openEnvelope(envelope, appKey(), drop == 512 ? 625 : 512, &opened, &error));
-    EXPECT_NE(opened, content) << "a wrong drop must not open the content";
+    if (!content.empty()) { EXPECT_NE(opened, content) << "a wrong drop must not open the content"; }
   }
-  EXPECT_EQ(server::envelopeDrop(1), 625u);
-  EXPECT_EQ(server::envelopeDrop(33), 625u);
-  EXPECT_EQ(server::envelopeDrop(88), 768u);
-  EXPECT_EQ(server::envelopeDrop(48), 512u);
-}
-
-TEST(ServerEnvelope, LayoutOfA1024BitKeyAndTenBytes) {
-  const std::string envelope = opensslEnvelope(appKey(), kRc4Key, 512, "0123456789");
+  for (const auto& [type, drop] : {std::pair{1, 625u}, {33, 625u}, {88, 768u}, {48, 512u}})
+    EXPECT_EQ(server::envelopeDrop(type), drop) << type;
   server::EnvelopeLayout layout;
   std::string error;
-  ASSERT_TRUE(server::parseEnvelope(envelope, &layout, &error)) << error;
+  ASSERT_TRUE(server::parseEnvelope(opensslEnvelope(appKey(), kRc4Key, 512, "0123456789"), &layout, &error)) << error;
   EXPECT_EQ(layout.keyBlobLength, 140u);
   EXPECT_EQ(layout.rsaLength, 128u);
   EXPECT_EQ(layout.contentLength, 10u);
   EXPECT_EQ(layout.totalLength, 166u);
-  const Bytes raw = opensslBase64Decode(envelope);
-  EXPECT_EQ(std::string(raw.begin(), raw.begin() + 8), "00000140");
-}
-
-TEST(ServerEnvelope, EmptyContentOpens) {
-  const std::string envelope = opensslEnvelope(appKey(), kRc4Key, 512, "");
-  std::string opened = "x", error;
-  ASSERT_TRUE(server::openEnvelope(envelope, appKey(), 512, &opened, &error)) << error;
-  EXPECT_EQ(opened, "");
 }
 
 // Each bad envelope must be refused with one line that names what is wrong.
 TEST(ServerEnvelope, RefusesCorruptTruncatedAndForeignEnvelopes) {
   const std::string good = opensslEnvelope(appKey(), kRc4Key, 512, "S1700000000:hello");
-  const Bytes raw = opensslBase64Decode(good);
   auto edited = [&](const std::function<void(Bytes&)>& edit) {
-    Bytes copy = raw;
+    Bytes copy = opensslBase64Decode(good);
     edit(copy);
     return opensslBase64(copy);
   };
-  struct Case {
+  const struct {
     const char* name;
     std::string envelope;
-    const PrivateKey* key;
+    const server::PrivateKey* key;
     const char* expected;  // part of the message
-  };
-  const Case cases[] = {
+  } cases[] = {
       {"empty", "", &appKey(), "empty"},
       {"not base64", "@@@@" + good, &appKey(), "base64"},
       {"cut inside a base64 group", good.substr(0, good.size() - 1), &appKey(), "base64"},
@@ -84,7 +67,7 @@ TEST(ServerEnvelope, RefusesCorruptTruncatedAndForeignEnvelopes) {
       {"foreign key of the same size", good, &foreignKey(), "unwrap"},
       {"foreign key of another size", good, &encKey(), "foreign"},
   };
-  for (const Case& c : cases) {
+  for (const auto& c : cases) {
     std::string opened, error;
     EXPECT_FALSE(server::openEnvelope(c.envelope, *c.key, 512, &opened, &error)) << c.name;
     EXPECT_NE(error.find(c.expected), std::string::npos) << c.name << ": " << error;
@@ -93,128 +76,68 @@ TEST(ServerEnvelope, RefusesCorruptTruncatedAndForeignEnvelopes) {
   }
 }
 
-TEST(ServerEnvelope, SplitsTheStrengthWrapper) {
-  server::Wrapped w;
-  std::string error;
-  ASSERT_TRUE(server::splitWrapped("S1700000000:pay:load", &w, &error));
-  EXPECT_EQ(w.strength, 'S');
-  EXPECT_EQ(w.timestamp, "1700000000");
-  EXPECT_EQ(w.payload, "pay:load");
-  ASSERT_TRUE(server::splitWrapped("E:", &w, &error));
-  EXPECT_EQ(w.timestamp, "");
-  EXPECT_EQ(w.payload, "");
-  for (const char* bad : {"", "S", "S123", "X123:abc"}) EXPECT_FALSE(server::splitWrapped(bad, &w, &error)) << bad;
-}
-
-TEST(ServerPayloads, KeyouBlocks) {
-  struct Case {
-    std::string block;
-    bool ok;
-    std::string message;
-  };
+TEST(ServerPayloads, WrapperKeyouBlocksAndLengthPrefixedPairs) {
+  // Each row: the text, whether it parses, and the fields it gives ("|" between two fields).
   const std::string filler(20, '\x5a');
-  const Case cases[] = {
-      {"05hello" + filler, true, "hello"},
-      {"01x" + filler, true, "x"},
-      {std::string("00") + filler, false, ""},
-      {"99abc", false, ""},
-      {"a5hello", false, ""},
-      {std::string(":0") + std::string(100, 'm') + "zz", true, std::string(100, 'm')},  // 100 runs past '9'
-  };
-  for (const Case& c : cases) {
-    std::string message, error;
-    EXPECT_EQ(server::parseKeyouBlock(c.block, &message, &error), c.ok) << c.block;
-    if (c.ok) {
-      EXPECT_EQ(message, c.message);
-    }
-  }
-}
-
-TEST(ServerPayloads, LengthPrefixedPairs) {
-  struct Case {
-    std::string pair;
+  const struct {
+    char kind;  // W wrapper, K Keyou block, P length-prefixed pair
+    std::string in;
     bool ok;
-    std::string timestamp, text;
+    std::string fields;
+  } cases[] = {
+      {'W', "S1700000000:pay:load", true, "S|1700000000|pay:load"},
+      {'W', "E:", true, "E||"},
+      {'W', "", false, ""}, {'W', "S", false, ""}, {'W', "S123", false, ""}, {'W', "X123:abc", false, ""},
+      {'K', "05hello" + filler, true, "hello"},
+      {'K', "01x" + filler, true, "x"},
+      {'K', "00" + filler, false, ""}, {'K', "99abc", false, ""}, {'K', "a5hello", false, ""},
+      {'K', ":0" + std::string(100, 'm') + "zz", true, std::string(100, 'm')},  // 100 runs past '9'
+      {'P', "041700041234", true, "1700|1234"},
+      {'P', "0000", true, "|"},
+      {'P', "10170000000005hello", true, "1700000000|hello"},
+      {'P', "02ab" "100" + std::string(100, 't'), true, "ab|" + std::string(100, 't')},
+      {'P', "0417000510pw", false, ""}, {'P', "041700021", false, ""}, {'P', "0417000212345", false, ""},
+      {'P', "x", false, ""},
   };
-  const Case cases[] = {
-      {"0417000510pw", false, "", ""},
-      {"041700041234", true, "1700", "1234"},
-      {"0000", true, "", ""},
-      {"10170000000005hello", true, "1700000000", "hello"},
-      {"02ab" "100" + std::string(100, 't'), true, "ab", std::string(100, 't')},
-      {"041700021", false, "", ""},
-      {"0417000212345", false, "", ""},
-      {"x", false, "", ""},
-  };
-  for (const Case& c : cases) {
-    std::string ts, text, error;
-    EXPECT_EQ(server::parseLengthPrefixedPair(c.pair, &ts, &text, &error), c.ok) << c.pair;
-    if (c.ok) {
-      EXPECT_EQ(ts, c.timestamp);
-      EXPECT_EQ(text, c.text);
+  for (const auto& c : cases) {
+    std::string a, b, error, fields;
+    server::Wrapped w;
+    bool ok = false;
+    if (c.kind == 'W') {
+      ok = server::splitWrapped(c.in, &w, &error);
+      fields = std::string(1, w.strength) + "|" + w.timestamp + "|" + w.payload;
+    } else if (c.kind == 'K') {
+      ok = server::parseKeyouBlock(c.in, &a, &error);
+      fields = a;
+    } else {
+      ok = server::parseLengthPrefixedPair(c.in, &a, &b, &error);
+      fields = a + "|" + b;
     }
+    EXPECT_EQ(ok, c.ok) << c.kind << " " << c.in;
+    if (c.ok) { EXPECT_EQ(fields, c.fields) << c.kind << " " << c.in; }
   }
 }
 
-// Values computed with Python's hashlib: md5(md5(p).hexdigest() + salt).hexdigest().
-TEST(ServerPayloads, SaltedHashKnownAnswers) {
-  struct Case {
+TEST(ServerPayloads, SaltedHashesAndPasswordMatching) {
+  // Values computed with Python's hashlib: md5(md5(p).hexdigest() + salt).hexdigest().
+  const struct {
     const char *password, *salt;
     char mode;
     const char* value;
-  };
-  const Case cases[] = {
+  } hashes[] = {
       {"pw", "salt", 'S', "c359e5975c5a3f45"},
       {"pw", "salt", 'F', "38b311d8c359e5975c5a3f454d3f4294"},
       {"123456", "a1b2c3", 'S', "f8bbb18037919adc"},
       {"Passw0rd!", "::x::", 'F', "f061fc492d56eb9b8e2dfe6bdd59f73c"},
+      {"pw", "salt", 'X', ""},
   };
-  for (const Case& c : cases) EXPECT_EQ(server::saltedHashValue(c.password, c.salt, c.mode), c.value);
-  EXPECT_EQ(server::saltedHashValue("pw", "salt", 'X'), "");
-}
-
-TEST(ServerPayloads, RsaLayoutsRoundTripWithOpenSsl) {
-  std::string plain, error;
-  const Bytes cipher = opensslPkcs1Encrypt(encKey(), bytesOf("hello"));
-  ASSERT_TRUE(server::openPkcs1Hex(encKey(), toHex(cipher), &plain, &error)) << error;
-  EXPECT_EQ(plain, "hello");
-  ASSERT_TRUE(server::openPkcs1Base64(encKey(), opensslBase64(cipher), &plain, &error)) << error;
-  EXPECT_EQ(plain, "hello");
-  EXPECT_FALSE(server::openPkcs1Hex(appKey(), toHex(cipher), &plain, &error)) << "2048-bit value, 1024-bit key";
-  EXPECT_FALSE(server::openPkcs1Hex(encKey(), "zz", &plain, &error));
-
-  Bytes block = bytesOf("05hello");
-  block.resize(encKey().size(), 0x33);
-  const Bytes keyou = opensslRawEncrypt(encKey(), block);
-  ASSERT_TRUE(server::openKeyouHex(encKey(), toHex(keyou), &plain, &error)) << error;
-  EXPECT_EQ(plain, "hello");
-  ASSERT_TRUE(server::openKeyouBase64(encKey(), opensslBase64(keyou), &plain, &error)) << error;
-  EXPECT_EQ(plain, "hello");
-}
-
-TEST(ServerPayloads, PinKeyDerivationOfType68) {
-  const Bytes master = fromHex("0123456789abcdeffedcba9876543210");
-  const Bytes working = fromHex("1111111111111111e0e0e0e0f1f1f1f1");
-  const Bytes pinKey = fromHex("2323232323232323abababababababab");
-  const std::string a = toHex(opensslDesEde(master, working, true));
-  const std::string b = toHex(opensslDesEde(working, pinKey, true));
-  std::string derived, error;
-  ASSERT_TRUE(server::derivePinKey68(toHex(master), a, b, &derived, &error)) << error;
-  EXPECT_EQ(toHex(bytesOf(derived)), toHex(pinKey));
-  EXPECT_FALSE(server::derivePinKey68(toHex(master), a.substr(2), b, &derived, &error));
-  EXPECT_FALSE(server::derivePinKey68(toHex(master), "zz" + a.substr(2), b, &derived, &error));
-}
-
-TEST(ServerPayloads, PasswordMatchingByType) {
-  server::Opened opened;
-  opened.contentOpened = true;
-  struct Case {
+  for (const auto& c : hashes) EXPECT_EQ(server::saltedHashValue(c.password, c.salt, c.mode), c.value) << c.password;
+  const struct {
     int type;
     std::string content, password, salt;
     char mode;
     bool match;
-  };
-  const Case cases[] = {
+  } matches[] = {
       {47, "c359e5975c5a3f45", "pw", "salt", 'S', true},
       {48, "38b311d8c359e5975c5a3f454d3f4294", "pw", "salt", 'F', true},
       {48, "38b311d8c359e5975c5a3f454d3f4294", "pw", "salt", 'S', false},
@@ -227,13 +150,44 @@ TEST(ServerPayloads, PasswordMatchingByType) {
       {0, "hello", "hello!", "", 'S', false},
       {0, "", "", "", 'S', true},
   };
-  for (const Case& c : cases) {
+  server::Opened opened;
+  opened.contentOpened = true;
+  for (const auto& c : matches) {
     opened.content = c.content;
     EXPECT_EQ(server::matchesPassword(c.type, opened, c.password, c.salt, c.mode), c.match)
         << c.type << " " << c.password;
   }
   opened.contentOpened = false;
   EXPECT_FALSE(server::matchesPassword(0, opened, "hello", "", 'S'));
+}
+
+TEST(ServerPayloads, RsaLayoutsAndPinKeyDerivationAgainstOpenSsl) {
+  std::string plain, error;
+  const Bytes cipher = opensslPkcs1Encrypt(encKey(), bytesOf("hello"));
+  Bytes block = bytesOf("05hello");
+  block.resize(encKey().size(), 0x33);
+  const Bytes keyou = opensslRawEncrypt(encKey(), block);
+  using Opener = bool (*)(const server::PrivateKey&, const std::string&, std::string*, std::string*);
+  for (const auto& [opener, text] : {std::pair<Opener, std::string>{server::openPkcs1Hex, toHex(cipher)},
+                                   {server::openPkcs1Base64, opensslBase64(cipher)},
+                                   {server::openKeyouHex, toHex(keyou)},
+                                   {server::openKeyouBase64, opensslBase64(keyou)}}) {
+    ASSERT_TRUE(opener(encKey(), text, &plain, &error)) << error;
+    EXPECT_EQ(plain, "hello");
+  }
+  EXPECT_FALSE(server::openPkcs1Hex(appKey(), toHex(cipher), &plain, &error)) << "2048-bit value, 1024-bit key";
+  EXPECT_FALSE(server::openPkcs1Hex(encKey(), "zz", &plain, &error));
+
+  // Type 68: the PIN key is B decrypted under (A decrypted under the master key).
+  const Bytes master = fromHex("0123456789abcdeffedcba9876543210");
+  const Bytes working = fromHex("1111111111111111e0e0e0e0f1f1f1f1");
+  const Bytes pinKey = fromHex("2323232323232323abababababababab");
+  const std::string a = toHex(opensslDesEde(master, working, true)), b = toHex(opensslDesEde(working, pinKey, true));
+  std::string derived;
+  ASSERT_TRUE(server::derivePinKey68(toHex(master), a, b, &derived, &error)) << error;
+  EXPECT_EQ(bytesOf(derived), pinKey);
+  EXPECT_FALSE(server::derivePinKey68(toHex(master), a.substr(2), b, &derived, &error));
+  EXPECT_FALSE(server::derivePinKey68(toHex(master), "zz" + a.substr(2), b, &derived, &error));
 }
 
 // ---- the command line
@@ -247,11 +201,9 @@ TEST(ServerCli, OpensAnEnvelopeAndChecksTheSaltedHash) {
   EXPECT_EQ(run.out, "strength: W\ntimestamp: 1700000000\npayload: " + value + "\ncontent: " + value +
                          "\npassword: match\n");
   EXPECT_EQ(run.err, "");
-
   run = runOpenCli({"--type", "48", "--key", key, "--password", "pw2", "--salt", "salt", "-"}, envelope + "\n");
   EXPECT_EQ(run.status, 3);
   EXPECT_NE(run.out.find("password: mismatch"), std::string::npos);
-
   run = runOpenCli({"--layout", envelope});
   EXPECT_EQ(run.status, 0);
   EXPECT_EQ(run.out, "key-blob-length: 140\nrsa-length: 128\ncontent-length: 28\ntotal-length: 184\n");
@@ -260,22 +212,19 @@ TEST(ServerCli, OpensAnEnvelopeAndChecksTheSaltedHash) {
 TEST(ServerCli, BadInputGivesOneLineAndNonZeroExit) {
   const std::string good = opensslEnvelope(appKey(), kRc4Key, 512, "S1700000000:hello");
   const std::string app = dataPath("dispatch_app_key_1024.pem");
-  const std::string foreign = dataPath("dispatch_foreign_key_1024.pem");
   Bytes raw = opensslBase64Decode(good);
   raw.resize(raw.size() - 6);
-  const std::string truncated = opensslBase64(raw);
-  struct Case {
+  const struct {
     const char* name;
     std::vector<std::string> args;
     int status;
-  };
-  const Case cases[] = {
+  } cases[] = {
       {"corrupt", {"--key", app, good.substr(0, 40) + "!!!!" + good.substr(44)}, 1},
-      {"truncated", {"--key", app, truncated}, 1},
-      {"foreign", {"--key", foreign, good}, 1},
+      {"truncated", {"--key", app, opensslBase64(raw)}, 1},
+      {"foreign", {"--key", dataPath("dispatch_foreign_key_1024.pem"), good}, 1},
       {"garbage", {"--key", app, "hello world"}, 1},
       {"key file missing", {"--key", "/nonexistent.pem", good}, 1},
-      {"key file not PEM", {"--key", dataPath("../server_envelope_test.cpp"), good}, 1},
+      {"key file not PEM", {"--key", dataPath("SOURCES.md"), good}, 1},
       {"unknown type", {"--type", "65", "--key", app, good}, 1},
       {"no key", {good}, 1},
       {"no output", {"--key", app}, 2},
@@ -284,10 +233,9 @@ TEST(ServerCli, BadInputGivesOneLineAndNonZeroExit) {
       {"salt without password", {"--key", app, "--salt", "s", good}, 2},
       {"wrong password", {"--type", "0", "--key", app, "--password", "hellO", good}, 3},
   };
-  for (const Case& c : cases) {
+  for (const auto& c : cases) {
     const CliRun run = runOpenCli(c.args);
     EXPECT_EQ(run.status, c.status) << c.name << ": " << run.err;
-    ASSERT_FALSE(run.err.empty()) << c.name;
     EXPECT_EQ(run.err.rfind("tessel_open: ", 0), 0u) << c.name << ": " << run.err;
     EXPECT_EQ(run.err.find('\n'), run.err.size() - 1) << c.name << ": not one line: " << run.err;
   }

@@ -33,7 +33,7 @@ std::string unsealed(ContentStore& store) {
 
 }  // namespace
 
-TEST_F(SessionTable, CreateDefaultsAndReuseByName) {
+TEST_F(SessionTable, CreateDefaultsReuseByNameAndRefusedHandles) {
   const int h = createSession("pwd");
   ASSERT_EQ(h, 0);
   KeyboardSession* s = sessionAt(h);
@@ -45,12 +45,16 @@ TEST_F(SessionTable, CreateDefaultsAndReuseByName) {
   EXPECT_STREQ(s->content->algorithmCode, "000");
   EXPECT_EQ(s->content->length, 0);
   EXPECT_EQ(s->content->lastError, 0);
-
   typeInto(*s->content, "abc");
   EXPECT_EQ(createSession("pwd"), h) << "same name finds the same session";
   EXPECT_EQ(unsealed(*s->content), "abc") << "reuse leaves the entered text intact";
   EXPECT_EQ(createSession("other"), 1);
   EXPECT_EQ(createSession(nullptr), -1);
+  for (int bad : {-1, 2, 19, 20, 1000, -1000}) {
+    EXPECT_EQ(sessionAt(bad), nullptr) << bad;
+    destroySession(bad);  // must be a no-op
+  }
+  EXPECT_NE(sessionAt(1), nullptr);
 }
 
 TEST_F(SessionTable, FirstFreeSlotThenCircularEviction) {
@@ -68,53 +72,37 @@ TEST_F(SessionTable, FirstFreeSlotThenCircularEviction) {
   EXPECT_STREQ(sessionAt(0)->sessionName, "wraps");
 }
 
-TEST_F(SessionTable, HandlesOutsideTheTableAreRefused) {
-  for (int h : {-1, 0, 19, 20, 1000, -1000}) {
-    EXPECT_EQ(sessionAt(h), nullptr) << h;
-    destroySession(h);  // must be a no-op
-  }
-}
-
-TEST_F(SessionTable, SealedBytesAreRc4OfTheTextUnderTheSealKey) {
+TEST_F(SessionTable, SealClearAndLength) {
   KeyboardSession* s = sessionAt(createSession("seal"));
   ASSERT_NE(s, nullptr);
   const std::string text = "Tr0ub4dor&3 correct horse";
   typeInto(*s->content, text.substr(0, 10));
   typeInto(*s->content, text.substr(10));
   ASSERT_EQ(contentLength(*s), static_cast<int>(text.size()));
-
+  // While idle the buffer holds the keystream-from-start encryption, not the text; a guard
+  // reseals on the way out.
   const Bytes expected = test::opensslRc4(Bytes(kSealKey, kSealKey + 12), test::bytesOf(text));
-  EXPECT_EQ(Bytes(s->content->plaintext, s->content->plaintext + text.size()), expected)
-      << "while idle the buffer holds the keystream-from-start encryption, not the text";
+  EXPECT_EQ(Bytes(s->content->plaintext, s->content->plaintext + text.size()), expected);
   EXPECT_EQ(unsealed(*s->content), text);
-  EXPECT_EQ(Bytes(s->content->plaintext, s->content->plaintext + text.size()), expected)
-      << "a guard reseals on the way out";
-}
+  EXPECT_EQ(Bytes(s->content->plaintext, s->content->plaintext + text.size()), expected);
 
-TEST_F(SessionTable, ClearZeroesEverything) {
-  KeyboardSession* s = sessionAt(createSession("clear"));
-  typeInto(*s->content, "secret");
   clearContent(*s->content);
   EXPECT_EQ(contentLength(*s), 0);
   for (std::size_t k = 0; k < kContentBufferSize; ++k) {
     ASSERT_EQ(s->content->plaintext[k], 0);
     ASSERT_EQ(s->content->scratch[k], 0);
   }
-}
-
-TEST_F(SessionTable, LengthIsSignExtendedFrom16Bits) {
-  KeyboardSession* s = sessionAt(createSession("len"));
   s->content->length = 0x8001;  // never produced by typing, but the read must not widen it wrongly
   EXPECT_EQ(contentLength(*s), -32767);
   s->content->length = 0;
 }
 
-TEST_F(SessionTable, OwnedTextReplacement) {
+TEST(OwnedText, Replacement) {
   char* field = nullptr;
-  EXPECT_TRUE(replaceOwnedText(field, "first"));
-  EXPECT_STREQ(field, "first");
-  EXPECT_TRUE(replaceOwnedText(field, "second"));
-  EXPECT_STREQ(field, "second");
+  for (const char* text : {"first", "second"}) {
+    EXPECT_TRUE(replaceOwnedText(field, text));
+    EXPECT_STREQ(field, text);
+  }
   EXPECT_TRUE(replaceOwnedText(field, nullptr));
   EXPECT_EQ(field, nullptr);
   releaseOwnedText(field);

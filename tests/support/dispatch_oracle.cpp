@@ -2,12 +2,14 @@
 // which GoogleTest reports as a test failure.
 #include "support/dispatch_oracle.h"
 
+#include <openssl/encoder.h>
 #include <openssl/evp.h>
 #include <openssl/rsa.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
 #include <algorithm>
+#include <cctype>
 #include <cstdio>
 #include <cstdlib>
 #include <fstream>
@@ -34,41 +36,6 @@ const server::PrivateKey& testKey(const std::string& fileName) {
   return it->second;
 }
 
-std::string opensslMd5Hex(const std::string& data) {
-  unsigned char digest[16];
-  unsigned int n = 0;
-  if (EVP_Digest(data.data(), data.size(), digest, &n, EVP_md5(), nullptr) != 1) throw std::runtime_error("MD5");
-  return toHex(Bytes(digest, digest + 16));
-}
-
-Bytes opensslSha1(const std::string& data) {
-  unsigned char digest[20];
-  unsigned int n = 0;
-  if (EVP_Digest(data.data(), data.size(), digest, &n, EVP_sha1(), nullptr) != 1) throw std::runtime_error("SHA-1");
-  return Bytes(digest, digest + 20);
-}
-
-Bytes opensslDesEde(const Bytes& key16, const Bytes& data, bool encrypt) {
-  EVP_CIPHER_CTX* ctx = EVP_CIPHER_CTX_new();
-  Bytes out(data.size() + 16);
-  int n = 0, tail = 0;
-  const bool ok = EVP_CipherInit_ex(ctx, EVP_des_ede_ecb(), nullptr, key16.data(), nullptr, encrypt ? 1 : 0) == 1 &&
-                  EVP_CIPHER_CTX_set_padding(ctx, 0) == 1 &&
-                  EVP_CipherUpdate(ctx, out.data(), &n, data.data(), static_cast<int>(data.size())) == 1 &&
-                  EVP_CipherFinal_ex(ctx, out.data() + n, &tail) == 1;
-  EVP_CIPHER_CTX_free(ctx);
-  if (!ok) throw std::runtime_error("DES-EDE");
-  out.resize(static_cast<std::size_t>(n + tail));
-  return out;
-}
-
-std::string opensslBase64(const Bytes& data) {
-  std::string out(4 * ((data.size() + 2) / 3) + 1, '\0');
-  const int n = EVP_EncodeBlock(reinterpret_cast<unsigned char*>(&out[0]), data.data(), static_cast<int>(data.size()));
-  out.resize(static_cast<std::size_t>(n));
-  return out;
-}
-
 Bytes opensslBase64Decode(const std::string& text) {
   if (text.size() % 4 != 0) throw std::runtime_error("base64 length");
   Bytes out(text.size() / 4 * 3 + 1);
@@ -84,26 +51,41 @@ Bytes opensslBase64Decode(const std::string& text) {
 }
 
 namespace {
-Bytes rsaEncrypt(const server::PrivateKey& key, const Bytes& in, int padding) {
+Bytes rsa(const server::PrivateKey& key, const Bytes& in, int padding, bool encrypt) {
   EVP_PKEY_CTX* ctx = EVP_PKEY_CTX_new(key.get(), nullptr);
+  auto run = encrypt ? EVP_PKEY_encrypt : EVP_PKEY_decrypt;
   std::size_t n = 0;
-  bool ok = ctx != nullptr && EVP_PKEY_encrypt_init(ctx) == 1 && EVP_PKEY_CTX_set_rsa_padding(ctx, padding) == 1 &&
-            EVP_PKEY_encrypt(ctx, nullptr, &n, in.data(), in.size()) == 1;
+  bool ok = ctx != nullptr && (encrypt ? EVP_PKEY_encrypt_init(ctx) : EVP_PKEY_decrypt_init(ctx)) == 1 &&
+            EVP_PKEY_CTX_set_rsa_padding(ctx, padding) == 1 && run(ctx, nullptr, &n, in.data(), in.size()) == 1;
   Bytes out(n);
-  ok = ok && EVP_PKEY_encrypt(ctx, out.data(), &n, in.data(), in.size()) == 1;
+  ok = ok && run(ctx, out.data(), &n, in.data(), in.size()) == 1;
   EVP_PKEY_CTX_free(ctx);
-  if (!ok) throw std::runtime_error("RSA encryption");
+  if (!ok) throw std::runtime_error(encrypt ? "RSA encryption" : "RSA decryption");
   out.resize(n);
   return out;
 }
 }  // namespace
 
-Bytes opensslPkcs1Encrypt(const server::PrivateKey& key, const Bytes& message) {
-  return rsaEncrypt(key, message, RSA_PKCS1_PADDING);
+Bytes opensslPkcs1Encrypt(const server::PrivateKey& key, const Bytes& m) {
+  return rsa(key, m, RSA_PKCS1_PADDING, true);
+}
+Bytes opensslRawEncrypt(const server::PrivateKey& key, const Bytes& b) { return rsa(key, b, RSA_NO_PADDING, true); }
+Bytes opensslRawDecrypt(const server::PrivateKey& key, const Bytes& c) { return rsa(key, c, RSA_NO_PADDING, false); }
+Bytes opensslPkcs1Decrypt(const server::PrivateKey& key, const Bytes& c) {
+  return rsa(key, c, RSA_PKCS1_PADDING, false);
 }
 
-Bytes opensslRawEncrypt(const server::PrivateKey& key, const Bytes& block) {
-  return rsaEncrypt(key, block, RSA_NO_PADDING);
+std::string opensslPublicDerHex(const server::PrivateKey& key) {
+  unsigned char* der = nullptr;
+  std::size_t len = 0;
+  OSSL_ENCODER_CTX* ctx = OSSL_ENCODER_CTX_new_for_pkey(key.get(), EVP_PKEY_PUBLIC_KEY, "DER", "pkcs1", nullptr);
+  const bool ok = ctx != nullptr && OSSL_ENCODER_to_data(ctx, &der, &len) == 1;
+  OSSL_ENCODER_CTX_free(ctx);
+  if (!ok) throw std::runtime_error("public key DER");
+  std::string hex = toHex(Bytes(der, der + len));
+  OPENSSL_free(der);
+  for (char& ch : hex) ch = static_cast<char>(std::toupper(static_cast<unsigned char>(ch)));
+  return hex;
 }
 
 std::string opensslEnvelope(const server::PrivateKey& key, const Bytes& rc4Key, std::size_t drop,

@@ -1,6 +1,7 @@
-// OpenSSL-backed oracles for the dispatcher and server-side suites (test-only): digests, two-key
-// triple DES, base64, an envelope assembled from its parts, and an in-process run of the
-// tessel_open command line in a child process.
+// OpenSSL-backed oracles for the RSA, dispatcher and server-side suites (test-only): the suites'
+// private keys, raw and PKCS#1 RSA by OpenSSL under them, an envelope assembled from its parts,
+// and a run of the tessel_open command line in a child process. The primitive oracles come from
+// openssl_oracle.h.
 #pragma once
 
 #include <cstdint>
@@ -19,17 +20,20 @@ const server::PrivateKey& testKey(const std::string& fileName);
 inline const server::PrivateKey& appKey() { return testKey("dispatch_app_key_1024.pem"); }
 inline const server::PrivateKey& encKey() { return testKey("dispatch_enc_key_2048.pem"); }
 inline const server::PrivateKey& foreignKey() { return testKey("dispatch_foreign_key_1024.pem"); }
+// The demo private key of the built-in default modulus (slot 12).
+inline const server::PrivateKey& builtinDefaultKey() { return testKey("builtin_default_key.pem"); }
 
-std::string opensslMd5Hex(const std::string& data);  // lower case
-Bytes opensslSha1(const std::string& data);
-// Two-key triple DES (DES-EDE) in ECB over whole blocks, no padding.
-Bytes opensslDesEde(const Bytes& key16, const Bytes& data, bool encrypt);
-std::string opensslBase64(const Bytes& data);
 // Throws on text that is not canonical base64.
 Bytes opensslBase64Decode(const std::string& text);
 // PKCS#1 v1.5 encryption (random padding) and raw RSA under the key's public half.
 Bytes opensslPkcs1Encrypt(const server::PrivateKey& key, const Bytes& message);
 Bytes opensslRawEncrypt(const server::PrivateKey& key, const Bytes& block);
+// What only the key owner can do: c^d mod n as exactly k bytes, and PKCS#1 v1.5 type 2
+// decryption (throws when the block does not unpad).
+Bytes opensslRawDecrypt(const server::PrivateKey& key, const Bytes& cipher);
+Bytes opensslPkcs1Decrypt(const server::PrivateKey& key, const Bytes& cipher);
+// The public half as PKCS#1 RSAPublicKey DER, in upper-case hex.
+std::string opensslPublicDerHex(const server::PrivateKey& key);
 
 // The digital envelope built with OpenSSL alone: "%08d"(k+12), SIMPLEBLOB header, the RSA value
 // of rc4Key reversed, "%08d"(L), RC4 after `drop` bytes. wrappedKey (k bytes, big-endian) is

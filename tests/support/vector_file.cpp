@@ -2,6 +2,7 @@
 // file that does not look as expected.
 #include "support/vector_file.h"
 
+#include <cctype>
 #include <fstream>
 #include <stdexcept>
 
@@ -60,56 +61,29 @@ std::vector<VectorRecord> readVectorRecords(const std::string& path) {
 }
 
 std::vector<Pkcs1Example> readPkcs1Examples(const std::string& path) {
+  // Hex values follow "# Name:" headers and end at a blank or comment line; each example's
+  // ciphertext ("# Encryption:") comes last, after the modulus of its key and its message and seed.
+  static const std::string kExample = "# PKCS#1 v1.5 Encryption Example ";
   std::ifstream in = open(path);
   std::vector<Pkcs1Example> examples;
-  std::string line, modulus;
-  std::string* collecting = nullptr;
-  std::string message, seed, cipher;
-  int keyNumber = 0, exampleNumber = 0;
-  bool modulusDone = false;
-  auto finish = [&] {
-    if (!cipher.empty()) {
-      examples.push_back({std::to_string(keyNumber) + "." + std::to_string(exampleNumber), modulus,
-                          fromHex(message), fromHex(seed), fromHex(cipher)});
-    }
-    message.clear();
-    seed.clear();
-    cipher.clear();
-  };
+  std::map<std::string, std::string> hex;
+  std::string line, field, name;
   while (std::getline(in, line)) {
     const std::string t = trim(line);
-    if (t.rfind("# Example ", 0) == 0) {
-      finish();
-      keyNumber = std::stoi(t.substr(10));
-      exampleNumber = 0;
-      modulus.clear();
-      modulusDone = false;
-      collecting = nullptr;
-    } else if (t.rfind("# PKCS#1 v1.5 Encryption Example", 0) == 0 ||
-               (t.rfind("# PKCS#1 v1.5 encryption of", 0) == 0)) {
-      finish();
-      collecting = nullptr;
-    } else if (t == "# Modulus:") {
-      collecting = modulusDone ? nullptr : &modulus;
-      modulusDone = true;
-    } else if (t == "# Message:") {
-      ++exampleNumber;
-      collecting = &message;
-    } else if (t == "# Seed:") {
-      collecting = &seed;
-    } else if (t == "# Encryption:") {
-      collecting = &cipher;
-    } else if (t.empty() || t[0] == '#' || t[0] == '=') {
-      collecting = nullptr;
-    } else if (collecting != nullptr) {
+    if (!t.empty() && t[0] != '#' && t[0] != '=') {
       for (char c : t)
-        if (c != ' ') *collecting += c;
+        if (c != ' ' && !field.empty()) hex[field] += c;
+      continue;
     }
+    if (field == "Encryption") {
+      std::string modulus = hex["Modulus"];
+      for (auto& c : modulus) c = static_cast<char>(std::toupper(static_cast<unsigned char>(c)));
+      examples.push_back({name, modulus, fromHex(hex["Message"]), fromHex(hex["Seed"]), fromHex(hex["Encryption"])});
+    }
+    field.clear();
+    if (t.rfind(kExample, 0) == 0) name = t.substr(kExample.size());
+    if (t.size() > 3 && t[0] == '#' && t.back() == ':') hex[field = t.substr(2, t.size() - 3)].clear();
   }
-  finish();
-  for (auto& e : examples)
-    for (auto& c : e.modulusHex)
-      if (c >= 'a' && c <= 'f') c = static_cast<char>(c - 'a' + 'A');
   return examples;
 }
 
