@@ -7,8 +7,21 @@
 namespace tessel {
 
 #if defined(__unix__) || defined(__APPLE__)
-long rand48Next() noexcept { return ::lrand48(); }
-void rand48Seed(long seed) noexcept { ::srand48(seed); }
+namespace {
+// lrand48/srand48 keep one unguarded process-wide state (glibc: MT-Unsafe race:drand48), and
+// the stream is drawn from several threads: session creation on the UI thread, layout builds
+// on each surface's GL thread (under the session lock, which two sessions do not share).
+std::mutex g_libcMutex;
+}  // namespace
+
+long rand48Next() noexcept {
+  std::lock_guard<std::mutex> guard(g_libcMutex);
+  return ::lrand48();
+}
+void rand48Seed(long seed) noexcept {
+  std::lock_guard<std::mutex> guard(g_libcMutex);
+  ::srand48(seed);
+}
 #else
 namespace {
 std::mutex g_mutex;
