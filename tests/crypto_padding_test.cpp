@@ -8,7 +8,6 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
-#include <cstring>
 #include <string>
 
 #include "crypto/codec.h"
@@ -123,6 +122,7 @@ TEST(PaddingReceiver, OpenSslPrivateKeyOpensPkcs1AndKeyouBlocks) {
   const Bytes m = test::bytesOf("0123456789abcdef");
   for (int i = 0; i < 10; ++i) {
     const SecureBuffer block = pkcs1Type2Block(m.data(), m.size(), key.size());
+    ASSERT_TRUE(block);
     const Bytes b(block.data(), block.data() + block.size());
     EXPECT_EQ(std::count(b.begin() + 2, b.end() - static_cast<long>(m.size()) - 1, 0), 0) << "zero in the filler";
     EXPECT_EQ(test::opensslPkcs1Decrypt(key, test::fromHex(rsa(key.modulusHex(), block))), m);

@@ -7,6 +7,8 @@
 // read out of bounds on any truncation or mutation (ASan builds check that).
 #include <gtest/gtest.h>
 
+#include <cctype>
+#include <cstdio>
 #include <random>
 #include <set>
 #include <string>

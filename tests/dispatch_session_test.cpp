@@ -7,6 +7,7 @@
 
 #include <cstring>
 #include <string>
+#include <tuple>
 
 #include "crypto/error_table.h"
 #include "crypto/moduli.h"

@@ -3,7 +3,10 @@
 // refusal of corrupt, truncated and foreign input by the library and the tessel_open command.
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <functional>
+#include <string>
+#include <vector>
 
 #include "server/envelope.h"
 #include "support/dispatch_oracle.h"
