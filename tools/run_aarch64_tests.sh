@@ -7,8 +7,8 @@
 #   tools/run_aarch64_tests.sh -LE 'noemu|gpu'  # quick pass without the Mesa rendering suites
 #
 # Extra arguments go to ctest. Installs what it needs, only when missing: the host packages of
-# tools/setup/packages.txt (cross compiler and QEMU among them), then the arm64 architecture and
-# the target's libraries from Debian multiarch (those cannot be listed in packages.txt: the
+# tools/setup/packages.txt, the cross compiler and QEMU, then the arm64 architecture and the
+# target's libraries from Debian multiarch (those cannot be listed in packages.txt: the
 # architecture must be added first). Build directory: build-aarch64.
 set -euo pipefail
 cd "$(dirname "${BASH_SOURCE[0]}")/.."
