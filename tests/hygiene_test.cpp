@@ -203,7 +203,7 @@ namespace tessel::test {
 namespace {
 
 // Typeable on the standard layout: both letter cases, digits and both symbol pages.
-constexpr char kPassword[] = "Qz7#Vx!k9Lm2&Pw";
+constexpr char kPassword[] = "Qz7#Vx!k9Lm2?Pw";
 constexpr std::size_t kPasswordLength = sizeof kPassword - 1;
 constexpr char kSalt[] = "NaCl-4711";
 constexpr char kHashRandomS[] = "1:NaCl-4711";  // suffix "::::::::::NaCl-4711::::::::::S"
