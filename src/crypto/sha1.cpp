@@ -14,6 +14,7 @@
 #include <immintrin.h>
 #endif
 
+#include "crypto/block_buffer.h"
 #include "crypto/wipe.h"
 
 namespace tessel {
@@ -172,22 +173,8 @@ void sha1Update(Sha1Context& ctx, const void* data, std::uint32_t length) noexce
                              (static_cast<std::uint64_t>(length) << 3);
   ctx.lengthLow = static_cast<std::uint32_t>(bits);
   ctx.lengthHigh = static_cast<std::uint32_t>(bits >> 32);
-  std::size_t left = length;
-  if (used != 0) {
-    const std::size_t take = left < 64 - used ? left : 64 - used;
-    std::memcpy(ctx.block + used, p, take);
-    used += take;
-    p += take;
-    left -= take;
-    if (used < 64) return;
-    compress(ctx.state, ctx.block, 1);
-  }
-  if (left >= 64) {
-    compress(ctx.state, p, left / 64);
-    p += left & ~std::size_t{63};
-    left &= 63;
-  }
-  if (left != 0) std::memcpy(ctx.block, p, left);
+  absorbBlocks(ctx.block, used, p, length,
+               [&ctx](const std::uint8_t* blocks, std::size_t count) { compress(ctx.state, blocks, count); });
 }
 
 void sha1Final(Sha1Context& ctx, std::uint8_t digest[20]) noexcept {
