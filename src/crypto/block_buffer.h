@@ -3,7 +3,8 @@
 // absorbBlocks completes a partly filled block from the input, compresses whole blocks straight
 // from the input without copying them, and keeps the tail in the context's block buffer.
 // `used` is how many bytes the buffer already holds (0..63); compress(blocks, count) runs the
-// digest's compression over `count` consecutive 64-byte blocks.
+// digest's compression over `count` consecutive 64-byte blocks. absorbInSlices feeds an input of
+// any size to an update function that takes 32-bit lengths (the one-shot digests).
 #pragma once
 
 #include <cstddef>
@@ -30,6 +31,17 @@ inline void absorbBlocks(std::uint8_t block[64], std::size_t used, const std::ui
     left &= 63;
   }
   if (left != 0) std::memcpy(block, p, left);
+}
+
+template <typename Update>
+inline void absorbInSlices(const void* data, std::size_t length, Update update) noexcept {
+  const std::uint8_t* p = static_cast<const std::uint8_t*>(data);
+  while (length > 0) {
+    const std::uint32_t n = length > 0x40000000u ? 0x40000000u : static_cast<std::uint32_t>(length);
+    update(p, n);
+    p += n;
+    length -= n;
+  }
 }
 
 }  // namespace tessel

@@ -159,13 +159,7 @@ void md5Final(Md5Context& ctx, std::uint8_t digest[16]) noexcept {
 void md5(const void* data, std::size_t length, std::uint8_t digest[16]) noexcept {
   Md5Context ctx;
   md5Init(ctx);
-  const std::uint8_t* p = static_cast<const std::uint8_t*>(data);
-  while (length > 0) {
-    const std::uint32_t n = length > 0x40000000u ? 0x40000000u : static_cast<std::uint32_t>(length);
-    md5Update(ctx, p, n);
-    p += n;
-    length -= n;
-  }
+  absorbInSlices(data, length, [&ctx](const std::uint8_t* p, std::uint32_t n) { md5Update(ctx, p, n); });
   md5Final(ctx, digest);
   wipeObject(ctx);
 }

@@ -195,14 +195,7 @@ void sha1Final(Sha1Context& ctx, std::uint8_t digest[20]) noexcept {
 void sha1(const void* data, std::size_t length, std::uint8_t digest[20]) noexcept {
   Sha1Context ctx;
   sha1Init(ctx);
-  const std::uint8_t* p = static_cast<const std::uint8_t*>(data);
-  // Updates take 32-bit lengths; feed anything longer in slices.
-  while (length > 0) {
-    const std::uint32_t n = length > 0x40000000u ? 0x40000000u : static_cast<std::uint32_t>(length);
-    sha1Update(ctx, p, n);
-    p += n;
-    length -= n;
-  }
+  absorbInSlices(data, length, [&ctx](const std::uint8_t* p, std::uint32_t n) { sha1Update(ctx, p, n); });
   sha1Final(ctx, digest);
   wipeObject(ctx);
 }
