@@ -1,7 +1,11 @@
 // Fuzzes the session as the managed side drives it: the input bytes decode into up to 96 steps
 // on four named sessions (create, destroy, every setter, surface changes, layout builds under
 // the session lock, touches inside and outside the grid, bursts of taps, clears, a prefilled
-// text to reach the 4092-character capacity cheaply, and every output getter). No GL: the surface-changed step is the geometry part only.
+// text to reach the 4092-character capacity cheaply, and every output getter). No GL: the
+// surface-changed step is the geometry part only. Two steps reach what apps do by accident:
+// a crowd of other names that fills the table and evicts sessions in circular order, and a
+// burst of taps on one thread while a second thread reads outputs of the same session, both
+// pinned exclusively as the entry points pin them.
 //
 // After every step, for every live session:
 //   - length <= 4092, maxLength <= 4092, and every byte from `length` to the end of the
@@ -27,6 +31,7 @@
 #include <limits>
 #include <mutex>
 #include <string>
+#include <thread>
 
 #include "crypto/codec.h"
 #include "crypto/error_table.h"
@@ -64,7 +69,7 @@ const char* const kTimestamps[] = {nullptr, "", "20240101120000", "1700000000"};
 enum Op : std::uint8_t {
   kCreate, kDestroy, kAccepts, kLimits, kKbdType, kKbdStyle, kModes, kStrings, kHashRandom,
   kKeys, kEccKey, kSurface, kBuild, kTouch, kBurst, kClear, kContentOutput, kPinCode,
-  kMeasure, kDegree, kVerify, kPrefill,
+  kMeasure, kDegree, kVerify, kPrefill, kCrowd, kTwoThreads,
   kTapFirst,  // every value from here on is a tap
   kOpCount = kTapFirst + 8,
 };
@@ -143,12 +148,18 @@ class Driver {
     for (int step = 0; step < kMaxSteps && in_.remaining_bytes() > 0; ++step) {
       const auto op = static_cast<Op>(in_.ConsumeIntegralInRange<int>(0, kOpCount - 1));
       const int which = in_.ConsumeIntegralInRange(0, kSessions - 1);
+      char* kept[kSessions][3] = {};
       for (int k = 0; k < kSessions; ++k) {
         KeyboardSession* s = live(k);
         before_[k].taken = false;
-        if (s != nullptr) before_[k].take(*s);
+        if (s == nullptr) continue;
+        before_[k].take(*s);
+        kept[k][0] = s->eccKey;
+        kept[k][1] = s->content->hashRandomSuffix;
+        kept[k][2] = s->content->dictionaryFilter;
       }
       const bool edits = apply(op, which);
+      reapEvicted(kept);
       if (trace_) {
         KeyboardSession* s = live(which);
         std::fprintf(stderr, "step %2d op %2d session %d length %d lastError %d\n", step, static_cast<int>(op), which,
@@ -257,6 +268,10 @@ class Driver {
       FUZZ_CHECK(handle >= 0 && tessel::sessionAt(handle) != nullptr);
       if (handles_[which] >= 0) FUZZ_CHECK(handle == handles_[which]);  // same name, same slot
       handles_[which] = handle;
+      return true;
+    }
+    if (op == kCrowd) {
+      crowd(in_.ConsumeIntegralInRange(1, 2 * tessel::kSessionSlots));
       return true;
     }
     KeyboardSession* sp = live(which);
@@ -408,6 +423,27 @@ class Driver {
         FUZZ_CHECK(v <= 0 && v >= -6);
         return false;
       }
+      case kTwoThreads: {
+        const int count = in_.ConsumeIntegralInRange(1, kMaxBurst);
+        const float fx = static_cast<float>(in_.ConsumeIntegralInRange(0, 39));
+        const float fy = static_cast<float>(in_.ConsumeIntegralInRange(0, 15));
+        const int handle = handles_[which];
+        std::thread reader([handle, count] {
+          for (int k = 0; k < count; ++k) {
+            tessel::SessionRef r(handle, tessel::Access::kExclusive);
+            if (!r) return;
+            const SecureBuffer m = tessel::computeMeasureValue(*r);
+            FUZZ_CHECK(static_cast<bool>(m) == (r->content->length != 0));
+            if (k % 8 == 0) tessel::contentOutput(*r, 48, "20240101120000");
+          }
+        });
+        for (int k = 0; k < count && taps_ < kMaxTapsPerInput; ++k, ++taps_) {
+          tessel::SessionRef r(handle, tessel::Access::kExclusive);
+          tap(*r, fx, fy);
+        }
+        reader.join();
+        return true;
+      }
       default: {
         if (taps_ >= kMaxTapsPerInput) return false;
         ++taps_;
@@ -420,7 +456,29 @@ class Driver {
     }
   }
 
+  // Creates `count` sessions of names no step uses; past 20 they evict in circular order.
+  void crowd(int count) {
+    for (int n = 0; n < count; ++n) {
+      const std::string name = "crowd-" + std::to_string(crowded_++);
+      const int handle = tessel::createSession(name.c_str());
+      FUZZ_CHECK(handle >= 0 && std::strcmp(tessel::sessionAt(handle)->sessionName, name.c_str()) == 0);
+    }
+  }
+
+  // A tracked session whose slot no longer holds its name was evicted (by a crowd, or by a
+  // create on a full table): the three strings a release keeps, taken before the step, are
+  // freed here so that leak detection stays on.
+  void reapEvicted(char* const (&kept)[kSessions][3]) {
+    for (int k = 0; k < kSessions; ++k) {
+      KeyboardSession* s = live(k);
+      if (handles_[k] < 0 || (s != nullptr && std::strcmp(s->sessionName, kNames[k]) == 0)) continue;
+      for (char* p : kept[k]) std::free(p);
+      handles_[k] = -1;
+    }
+  }
+
   FuzzedDataProvider& in_;
+  int crowded_ = 0;
   int handles_[kSessions] = {-1, -1, -1, -1};
   int taps_ = 0;
   Resting before_[kSessions];

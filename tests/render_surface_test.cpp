@@ -633,8 +633,8 @@ TEST(OddState, OutOfRangeTouchStateIsHarmless) {
 TEST(GlState, SurfaceStateTexturesAndFreshNamesOnRecreation) {
   Keyboard kb("render-params", {1});
   REQUIRE_GL(kb);
-  const auto allNames = [] {
-    const MainTextureSet& t = mainTextures();
+  const auto allNames = [&kb] {
+    const MainTextureSet& t = kb.s->mainTextures;
     std::vector<GLuint> v;
     auto add = [&](const TextureName* p, int n) {
       for (int i = 0; i < n; ++i) v.push_back(p[i].load());

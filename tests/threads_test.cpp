@@ -1,246 +1,308 @@
-// The threading model under stress, meant for ThreadSanitizer (tools/run_tsan.sh) but run by
-// every build: one UI thread touches, sets and reads output while one GL thread per surface
-// draws frames and now and then recreates its surface, on real Mesa GLES 1.1 contexts (one per
-// thread, as the app's renderers have). A second session's keyboard is drawn on a fourth GL
-// thread, so the process-wide texture sets are replaced while another surface draws from them.
+// Any entry point from any thread. The real native entry points are compiled into this suite and
+// called, by handle, from several threads through a minimal in-process JNIEnv, with GL surfaces
+// on real Mesa GLES 1.1 contexts. The test command runs it in the release build, under
+// ASan+UBSan and under TSan (tools/run_tsan.sh): a use after free, a data race, a torn seal or a
+// lost character fails the run. Every loop is bounded by a count, never by the clock alone.
 //
 // The contexts run on Mesa's softpipe unless GALLIUM_DRIVER says otherwise: llvmpipe's shader
-// JIT (LLVM) has process-wide state that TSan reports as racy when several contexts compile at
-// once, and under TSan it now and then faults inside the driver with four contexts drawing.
-// softpipe has no JIT, draws these small surfaces fast enough and needs no suppressions.
-//
-// Only the two surface-created handlers take the session lock; touches, setters, getters,
-// surface changes and draw frames meet on RelaxedField members. Under TSan any plain field
-// shared between these threads shows up as a data race and fails the run. Iterations are
-// bounded: the GL threads draw until the UI thread is done (at least a minimum of frames,
-// at most a cap), so a slow sanitized build only takes longer, never hangs.
+// JIT has process-wide state that TSan reports when several contexts compile at once.
 #include <gtest/gtest.h>
 
+#include <jni.h>
+
+#include <algorithm>
 #include <atomic>
-#include <cstdio>
 #include <cstdlib>
-#include <cstdint>
-#include <cstring>
-#include <functional>
+#include <optional>
+#include <set>
 #include <string>
 #include <thread>
 #include <vector>
 
-#include "crypto/measure.h"
-#include "input/layout.h"
-#include "input/touch.h"
-#include "pattern/strength.h"
-#include "render/surfaces.h"
-#include "session/output.h"
-#include "session/session.h"
-#include "session/settings.h"
+#include "com_qn_tessel_plugin_QNKbdJniLib.h"
+#include "server/envelope.h"
 #include "support/egl_context.h"
+#include "support/openssl_oracle.h"
+
+#define JNI(method) Java_com_qn_tessel_plugin_QNKbdJniLib_##method
 
 namespace tessel::test {
 namespace {
 
-// Small surfaces: llvmpipe's fill rate, not the library, bounds the frame rate.
-constexpr int kWidth = 320, kHeight = 200;        // keyboard surface
-constexpr int kPopWidth = 320, kPopHeight = 50;   // both pop-ups: one key row above it
-constexpr int kRenderers = 4;
-constexpr int kUiRounds = 1500;                   // at least, and until every renderer has
-constexpr int kMinFrames = 12;                    // drawn this many frames
-constexpr int kMaxUiRounds = 200000;
-constexpr int kMaxFrames = 4000;
-constexpr int kRecreateEvery = 5;                 // frames between surface re-creations
+// ---- a JNIEnv with only what the entry points call: strings and byte arrays as plain objects
 
-// A small deterministic generator per thread (the library's own sources are not for tests).
-struct Lcg {
-  std::uint64_t state;
-  std::uint32_t next() {
-    state = state * 6364136223846793005ULL + 1442695040888963407ULL;
-    return static_cast<std::uint32_t>(state >> 33);
-  }
-  float unit() { return static_cast<float>(next() & 0xFFFFFF) / 16777216.0f; }
+struct FakeString {
+  std::string text;
+};
+struct FakeBytes {
+  std::vector<jbyte> bytes;
 };
 
-struct GlThreadReport {
-  std::string error;  // context creation failure
-  int frames = 0;
-  int recreations = 0;
+const char* JNICALL getUtf(JNIEnv*, jstring s, jboolean* copy) {
+  if (copy != nullptr) *copy = JNI_FALSE;
+  return reinterpret_cast<FakeString*>(s)->text.c_str();
+}
+void JNICALL releaseUtf(JNIEnv*, jstring, const char*) {}
+jstring JNICALL newUtf(JNIEnv*, const char* utf) { return reinterpret_cast<jstring>(new FakeString{utf}); }
+jboolean JNICALL noException(JNIEnv*) { return JNI_FALSE; }
+void JNICALL clearException(JNIEnv*) {}
+jsize JNICALL arrayLength(JNIEnv*, jarray a) {
+  return static_cast<jsize>(reinterpret_cast<FakeBytes*>(a)->bytes.size());
+}
+jbyte* JNICALL byteElements(JNIEnv*, jbyteArray a, jboolean*) { return reinterpret_cast<FakeBytes*>(a)->bytes.data(); }
+void JNICALL releaseByteElements(JNIEnv*, jbyteArray, jbyte*, jint) {}
+jbyteArray JNICALL newBytes(JNIEnv*, jsize n) {
+  return reinterpret_cast<jbyteArray>(new FakeBytes{std::vector<jbyte>(static_cast<std::size_t>(n))});
+}
+void JNICALL setBytes(JNIEnv*, jbyteArray a, jsize start, jsize n, const jbyte* from) {
+  std::copy(from, from + n, reinterpret_cast<FakeBytes*>(a)->bytes.begin() + start);
+}
+void JNICALL deleteRef(JNIEnv*, jobject o) { delete reinterpret_cast<FakeBytes*>(o); }
+
+JNIEnv* env() {
+  static const JNINativeInterface_ table = [] {
+    JNINativeInterface_ t{};
+    t.GetStringUTFChars = getUtf;
+    t.ReleaseStringUTFChars = releaseUtf;
+    t.NewStringUTF = newUtf;
+    t.ExceptionCheck = noException;
+    t.ExceptionClear = clearException;
+    t.GetArrayLength = arrayLength;
+    t.GetByteArrayElements = byteElements;
+    t.ReleaseByteArrayElements = releaseByteElements;
+    t.NewByteArray = newBytes;
+    t.SetByteArrayRegion = setBytes;
+    t.DeleteLocalRef = deleteRef;
+    return t;
+  }();
+  static JNIEnv e{&table};
+  return &e;
+}
+
+// A managed-side string argument, alive for the call.
+struct Arg {
+  FakeString value;
+  explicit Arg(std::string s) : value{std::move(s)} {}
+  operator jstring() { return reinterpret_cast<jstring>(&value); }  // NOLINT: argument sugar
+};
+
+std::optional<std::string> take(jstring s) {
+  if (s == nullptr) return std::nullopt;
+  std::unique_ptr<FakeString> owned(reinterpret_cast<FakeString*>(s));
+  return owned->text;
+}
+
+bool takeBytes(jbyteArray a) {
+  std::unique_ptr<FakeBytes> owned(reinterpret_cast<FakeBytes*>(a));
+  return owned != nullptr && !owned->bytes.empty();
+}
+
+// ---- the app's side
+
+constexpr int kWidth = 320, kHeight = 200;  // keys 32 x 50 pixels
+constexpr int kSlots = 20;
+
+int openKeyboard(const std::string& name) {
+  const int h = JNI(createNativeSession)(env(), nullptr, Arg(name));
+  JNI(setNativeAccepts)(env(), nullptr, h, Arg("[[:print:]]*"));
+  JNI(setNativeMaxLength)(env(), nullptr, h, 64);
+  JNI(setNativeHashRandom)(env(), nullptr, h, Arg("1:stress-salt"));
+  FakeBytes code{{'c', 'o', 'd', 'e'}};
+  JNI(setNativeChallengeCode)(env(), nullptr, h, reinterpret_cast<jbyteArray>(&code));
+  return h;
+}
+
+// All three surfaces of a keyboard in the current context (created, changed).
+void createSurfaces(int h) {
+  JNI(setNativeSurfaceCreated)(env(), nullptr, h);
+  JNI(setNativeSurfaceChanged)(env(), nullptr, h, kWidth, kHeight, 1);
+  JNI(setNativePopSurfaceCreated)(env(), nullptr, h);
+  JNI(setNativePopSurfaceChanged)(env(), nullptr, h, kWidth, kHeight / 4);
+  JNI(setNativePopTopSurfaceCreated)(env(), nullptr, h);
+  JNI(setNativePopTopSurfaceChanged)(env(), nullptr, h, kWidth, kHeight / 4);
+}
+
+void drawAll(int h, int frame) {
+  JNI(setNativeDrawFrame)(env(), nullptr, h);
+  JNI(setNativePopDrawFrame)(env(), nullptr, h, frame % 2 == 0);
+  JNI(setNativePopTopDrawFrame)(env(), nullptr, h);
+}
+
+// Taps the top-row key of the unshuffled letter keyboard that holds c (one of "qwertyuiop").
+int tap(int h, char c) {
+  const float x = (static_cast<float>(std::string("qwertyuiop").find(c)) + 0.5f) * kWidth / 10.0f;
+  const float y = 0.5f * kHeight / 4.0f;
+  JNI(setNativeTouchPos)(env(), nullptr, h, 0, x, y);
+  return JNI(setNativeTouchPos)(env(), nullptr, h, 1, x, y);
+}
+
+std::optional<std::string> measure(int h) { return take(JNI(getNativeMeasureValue)(env(), nullptr, h)); }
+
+// Every getter once; returns the measure value.
+std::optional<std::string> everyGetter(int h) {
+  take(JNI(getNativeContent)(env(), nullptr, h, Arg("2026-11-23 12:00:00")));
+  take(JNI(getNativePinContent)(env(), nullptr, h, nullptr));
+  takeBytes(JNI(getNativeEncryptedPinCode)(env(), nullptr, h));
+  JNI(getNativeDegree)(env(), nullptr, h);
+  JNI(getNativeVerify)(env(), nullptr, h);
+  JNI(getNativeContentLen)(env(), nullptr, h);
+  take(JNI(getNativeLastError)(env(), nullptr, h));
+  return measure(h);
+}
+
+void destroyAll() {
+  for (int h = 0; h < kSlots; ++h) JNI(destroyNativeSession)(env(), nullptr, h);
+}
+
+// A GL thread: draws the three surfaces of whatever handle `target` holds, re-creating them now
+// and then and whenever `shown` is set (a new keyboard in the slot), until `stop`; counts frames.
+struct Renderer {
+  std::atomic<int> target{-1};
+  std::atomic<bool> shown{false};
+  std::atomic<bool> stop{false};
+  std::atomic<int> frames{0};
   unsigned glError = 0;
+  std::string contextError;
+  std::thread thread;
+
+  void start() {
+    thread = std::thread([this] {
+      GlesContext gl(kWidth, kHeight);
+      if (!gl.ok()) {
+        contextError = gl.error();
+        return;
+      }
+      for (int frame = 0; !stop.load() && frame < 200000; ++frame) {
+        const int h = target.load();
+        if (frame % 16 == 0 || shown.exchange(false)) createSurfaces(h);
+        drawAll(h, frame);
+        if (const GLenum e = glGetError(); e != GL_NO_ERROR && glError == 0) glError = e;
+        frames.fetch_add(1);
+      }
+    });
+  }
+  void show(int h) {
+    target.store(h);
+    shown.store(true);
+    waitFrames(2);
+  }
+  void waitFrames(int n) const {
+    const int until = frames.load() + n;
+    while (frames.load() < until && contextError.empty()) std::this_thread::yield();
+  }
+  void finish() {
+    stop.store(true);
+    thread.join();
+    EXPECT_TRUE(contextError.empty()) << contextError;
+    EXPECT_EQ(glError, 0u);
+  }
 };
 
-// Where the threads meet: renderers count themselves in once their surface exists (or failed)
-// and again after kMinFrames frames; the UI thread starts after the first and keeps going until
-// the second, and the renderers stop once the UI thread is done.
-struct Rendezvous {
-  std::atomic<int> surfacesUp{0};
-  std::atomic<int> warmedUp{0};
-  std::atomic<bool> uiDone{false};
+class AnyThread : public ::testing::Test {
+ protected:
+  static void SetUpTestSuite() { setenv("GALLIUM_DRIVER", "softpipe", 0); }
+  void SetUp() override { destroyAll(); }
+  void TearDown() override { destroyAll(); }
 };
 
-// One renderer: its own context, created and current on this thread; `create` runs the
-// surface-created (and -changed) handlers, `draw` one frame.
-void runRenderer(Rendezvous& meet, int width, int height, const std::function<void(int)>& create,
-                 const std::function<void(int)>& draw, GlThreadReport& report) {
-  GlesContext gl(width, height);
-  if (!gl.ok()) {
-    report.error = gl.error();
-    meet.surfacesUp.fetch_add(1);
-    meet.warmedUp.fetch_add(1);
-    return;
+// The app never destroys: the 21st distinct create evicts the keyboard being drawn.
+TEST_F(AnyThread, EvictionWhileDrawing) {
+  Renderer gl;
+  gl.start();
+  for (int round = 0; round < 6; ++round) {
+    gl.show(openKeyboard("visible"));
+    for (int k = 0; k < 25; ++k) openKeyboard("other-" + std::to_string(k));
+    EXPECT_NE(JNI(createNativeSession)(env(), nullptr, Arg("visible")), -1);
+    gl.waitFrames(2);
+    destroyAll();
   }
-  create(0);
-  meet.surfacesUp.fetch_add(1);
-  int frame = 0;
-  for (; frame < kMaxFrames && (frame < kMinFrames || !meet.uiDone.load()); ++frame) {
-    if (frame == kMinFrames) meet.warmedUp.fetch_add(1);
-    if (frame > 0 && frame % kRecreateEvery == 0) {
-      create(frame);
-      ++report.recreations;
-    }
-    draw(frame);
-    const GLenum e = glGetError();
-    if (e != GL_NO_ERROR && report.glError == 0) report.glError = e;
-  }
-  if (frame <= kMinFrames) meet.warmedUp.fetch_add(1);
-  glFinish();
-  report.frames = frame;
+  gl.finish();
 }
 
-// The UI thread's work: touches all over the keyboard (done included, which with finish mode 0
-// forces a layout rebuild at the next surface creation), the setters the renderers read, and
-// the output getters that unseal and reseal the content.
-struct UiReport {
-  int rounds = 0;
-  int releases = 0;
-  int doneReleases = 0;
-  int outputs = 0;
-  int measured = 0;
-};
-
-void runUi(KeyboardSession& s, Rendezvous& meet, UiReport& report) {
-  while (meet.surfacesUp.load() < kRenderers) std::this_thread::yield();
-  Lcg rng{12345};
-  for (int round = 0; round < kMaxUiRounds && (round < kUiRounds || meet.warmedUp.load() < kRenderers); ++round) {
-    const float x = rng.unit() * kWidth, y = rng.unit() * kHeight;
-    touch(s, 0, x, y);
-    if (rng.next() % 4 == 0) touch(s, 2, x + 1.0f, y);
-    const int up = touch(s, 1, x, y);
-    report.releases += up >= 0;
-    report.doneReleases += up == 1;
-
-    report.rounds = round + 1;
-    switch (round % 11) {
-      case 0: setKbdStyle(s, static_cast<std::int16_t>(rng.next() % 4)); break;
-      case 1: setPopMode(s, (rng.next() & 1) != 0); break;
-      case 2: setKbdMode(s, static_cast<std::int16_t>(rng.next() % 5 == 0)); break;
-      case 3: setSwitchMode(s, static_cast<std::int16_t>(rng.next() % 3)); break;
-      case 4: setKbdType(s, static_cast<std::int16_t>(rng.next() % 6 == 0 ? 1 + rng.next() % 2 : 0)); break;
-      case 5: setKbdRandom(s, (rng.next() & 1) != 0); break;
-      case 6: setFinishMode(s, static_cast<std::int16_t>(rng.next() % 4 == 0)); break;
-      case 7: {
-        SecureBuffer out = contentOutput(s, 48, "20240101120000");
-        report.outputs += static_cast<bool>(out);
-        break;
-      }
-      case 8: {
-        report.measured += static_cast<bool>(computeMeasureValue(s));
-        sessionDegree(s);
-        break;
-      }
-      case 9: sessionVerify(s); break;
-      case 10:
-        if (contentLength(s) > 24) clearContent(*s.content);
-        break;
-    }
+// Destroy and re-create while one thread types and another draws the same handle.
+TEST_F(AnyThread, DestroyWhileTypingOrDrawing) {
+  Renderer gl;
+  gl.start();
+  gl.show(openKeyboard("typed"));
+  std::atomic<bool> stop{false};
+  std::atomic<int> taps{0};
+  std::thread typist([&] {
+    for (int k = 0; !stop.load() && k < 400000; ++k) taps += tap(gl.target.load(), "qwertyuiop"[k % 10]) >= 0;
+  });
+  for (int round = 0; round < 16; ++round) {
+    const int h = gl.target.load();
+    JNI(destroyNativeSession)(env(), nullptr, h);
+    EXPECT_EQ(JNI(getNativeContentLen)(env(), nullptr, h), -1) << "a call after destroy finds nothing";
+    gl.show(openKeyboard("typed"));
   }
+  stop.store(true);
+  typist.join();
+  gl.finish();
+  EXPECT_GT(taps.load(), 0);
 }
 
-TEST(Threads, UiAndRendererThreadsShareTheSession) {
-  setenv("GALLIUM_DRIVER", "softpipe", 0);  // before the first EGL display is opened
-  const int handle = createSession("threads");
-  const int other = createSession("threads-other");
-  ASSERT_GE(handle, 0);
-  ASSERT_GE(other, 0);
-  KeyboardSession& s = *sessionAt(handle);
-  KeyboardSession& o = *sessionAt(other);
-  setAccepts(s, "[[:print:]]*");
-  setMaxLength(s, 32);
-  setMinLength(s, 4);
-  setHashRandom(s, "1:threads-salt");
-  setKbdRandom(s, true);
+// Typing while two threads call every getter: each measure value is the MD5 of what had been
+// typed so far, and at the end the text is whole. With an unguarded seal, overlapping
+// operations re-seal each other's work and the stored text changes for good.
+TEST_F(AnyThread, TwoReadersAtOnceLoseNothing) {
+  const std::string text = "pqowieurytqp";
+  std::set<std::string> prefixes;
+  for (std::size_t n = 1; n <= text.size(); ++n) prefixes.insert(opensslMd5Hex(text.substr(0, n)));
 
-  Rendezvous meet;
-  GlThreadReport mainReport, popReport, topReport, otherReport;
-  std::vector<std::thread> renderers;
-  renderers.emplace_back([&] {
-    runRenderer(
-        meet, kWidth, kHeight,
-        [&](int frame) {
-          mainSurfaceCreated(s);
-          mainSurfaceChanged(s, kWidth, kHeight, frame / kRecreateEvery % 3);  // variant 2: by aspect
-        },
-        [&](int) { mainDrawFrame(s); }, mainReport);
-  });
-  renderers.emplace_back([&] {
-    runRenderer(
-        meet, kPopWidth, kPopHeight,
-        [&](int) {
-          popSurfaceCreated(s);
-          popSurfaceChanged(s, kPopWidth, kPopHeight);
-        },
-        [&](int frame) { popDrawFrame(s, frame % 3 != 0); }, popReport);
-  });
-  renderers.emplace_back([&] {
-    runRenderer(
-        meet, kPopWidth, kPopHeight,
-        [&](int) {
-          popTopSurfaceCreated(s);
-          popTopSurfaceChanged(s, kPopWidth, kPopHeight);
-        },
-        [&](int) { popTopDrawFrame(s); }, topReport);
-  });
-  renderers.emplace_back([&] {
-    runRenderer(
-        meet, kWidth, kHeight,
-        [&](int) {
-          mainSurfaceCreated(o);
-          mainSurfaceChanged(o, kWidth, kHeight, 1);
-        },
-        [&](int) { mainDrawFrame(o); }, otherReport);
-  });
-
-  UiReport ui;
-  runUi(s, meet, ui);
-  meet.uiDone.store(true);
-  for (auto& t : renderers) t.join();
-
-  const std::pair<const char*, const GlThreadReport*> reports[] = {
-      {"keyboard", &mainReport}, {"pop-up", &popReport}, {"top pop-up", &topReport}, {"other keyboard", &otherReport}};
-  for (const auto& [what, r] : reports) {
-    SCOPED_TRACE(what);
-    ASSERT_TRUE(r->error.empty()) << r->error;
-    EXPECT_GE(r->frames, kMinFrames);
-    EXPECT_GT(r->recreations, 0);
-    EXPECT_EQ(r->glError, 0u);
+  GlesContext gl(kWidth, kHeight);
+  ASSERT_TRUE(gl.ok()) << gl.error();
+  const int h = openKeyboard("readers");
+  createSurfaces(h);
+  std::atomic<bool> typed{false};
+  std::atomic<int> wrong{0}, reads{0};
+  auto reader = [&] {
+    for (int k = 0; k < 30000 && !(typed.load() && k > 2000); ++k) {
+      const std::optional<std::string> value = k % 8 == 0 ? everyGetter(h) : measure(h);
+      reads.fetch_add(1);
+      if (value && prefixes.count(*value) == 0) wrong.fetch_add(1);
+    }
+  };
+  std::thread a(reader), b(reader);
+  for (char c : text) {
+    EXPECT_EQ(tap(h, c), 0);
+    std::this_thread::yield();
   }
-  std::printf("UI rounds %d (releases %d, done %d, outputs %d); frames drawn %d/%d/%d/%d, surfaces recreated %d/%d/%d/%d\n",
-              ui.rounds, ui.releases, ui.doneReleases, ui.outputs, mainReport.frames, popReport.frames,
-              topReport.frames, otherReport.frames, mainReport.recreations, popReport.recreations,
-              topReport.recreations, otherReport.recreations);
-  // The UI side did real work while the frames were drawn.
-  EXPECT_GT(ui.releases, kUiRounds / 4);
-  EXPECT_GT(ui.doneReleases, 0);
-  EXPECT_GT(ui.outputs, 0);
-  EXPECT_GT(ui.measured, 0);
+  typed.store(true);
+  a.join();
+  b.join();
+  EXPECT_EQ(wrong.load(), 0) << "of " << reads.load() << " reads";
+  EXPECT_EQ(JNI(getNativeContentLen)(env(), nullptr, h), static_cast<jint>(text.size()));
+  EXPECT_EQ(measure(h), opensslMd5Hex(text));
 
-  // The content stayed consistent: within maxLength, sealed at rest, printable when unsealed.
-  const std::size_t length = s.content->length;
-  EXPECT_LE(length, 32u);
-  {
-    ContentGuard guard(*s.content);
-    for (std::size_t i = 0; i < length; ++i) EXPECT_GE(guard.text()[i], 0x20) << "at " << i;
-    EXPECT_EQ(guard.text()[length], 0);
-  }
-  destroySession(handle);
-  destroySession(other);
+  // The backend gets the salted value of exactly that text.
+  server::PrivateKey key;
+  std::string error;
+  ASSERT_TRUE(key.loadPemFile(dataPath("builtin_default_key.pem"), &error)) << error;
+  server::OpenKeys keys;
+  keys.app = &key;
+  server::Opened opened;
+  const std::optional<std::string> envelope = take(JNI(getNativeContent)(env(), nullptr, h, Arg("ts")));
+  ASSERT_TRUE(envelope);
+  ASSERT_TRUE(server::openOutput(48, *envelope, keys, &opened, &error)) << error;
+  EXPECT_EQ(opened.payload, server::saltedHashValue(text, "stress-salt", 'S'));
+}
+
+// Two keyboards whose surfaces share one GL context each show their own layout.
+TEST_F(AnyThread, TwoKeyboardsInOneContextDrawTheirOwnLayout) {
+  GlesContext gl(kWidth, kHeight);
+  ASSERT_TRUE(gl.ok()) << gl.error();
+  const int a = openKeyboard("keyboard-a");
+  const int b = openKeyboard("keyboard-b");
+  JNI(setNativeKbdRandom)(env(), nullptr, b, JNI_TRUE);
+  auto frameOf = [&](int h) {
+    JNI(setNativeDrawFrame)(env(), nullptr, h);
+    return gl.readRgba();
+  };
+  createSurfaces(a);
+  const std::vector<std::uint8_t> alone = frameOf(a);
+  createSurfaces(b);
+  ASSERT_NE(frameOf(b), alone) << "keyboard b is not shuffled";
+  EXPECT_EQ(frameOf(a), alone) << "keyboard a shows keyboard b's keys";
 }
 
 }  // namespace

@@ -10,7 +10,7 @@
 namespace tessel {
 
 SecureBuffer computeMeasureValue(KeyboardSession& session) noexcept {
-  if (session.content == nullptr || session.content->length == 0) return SecureBuffer();
+  if (session.content->length == 0) return SecureBuffer();
   std::uint8_t digest[16];
   {
     ContentGuard guard(*session.content);

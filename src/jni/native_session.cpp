@@ -1,9 +1,10 @@
 // Native entry points of QNKbdJniLib for the session's life, its surfaces, touches and outputs.
 //
-// Each method converts its managed arguments, resolves the handle through sessionAt() (null for
+// Each method converts its managed arguments, pins the session through a SessionRef (null for
 // a negative handle, one of 20 or more, or an empty slot: all refused alike, with the value the
 // method documents for a bad handle), calls one session-level operation and converts the result
-// back. Result texts arrive as SecureBuffers: the managed copy is made first, then the buffer
+// back. Touches and outputs pin exclusively (the session's opLock); frames, surface callbacks
+// and the length pin shared and never wait for them. Result texts arrive as SecureBuffers: the managed copy is made first, then the buffer
 // goes out of scope and is wiped. No method leaves a managed exception pending, and no C++
 // exception can cross into the JVM (jni::shield). The setters live in native_settings.cpp.
 #include <jni.h>
@@ -21,7 +22,8 @@
 #include "input/touch.h"
 
 using tessel::KeyboardSession;
-using tessel::sessionAt;
+using tessel::Access;
+using tessel::SessionRef;
 namespace jni = tessel::jni;
 
 namespace {
@@ -34,12 +36,13 @@ constexpr int kContentType = 48;
 constexpr int kPinContentType = 47;
 
 jstring contentOutputOf(JNIEnv* env, jint handle, jstring timestamp, int type) noexcept {
-  KeyboardSession* s = sessionAt(handle);
-  if (s == nullptr) return nullptr;
+  if (handle < 0) return nullptr;
   jni::Utf8Chars stamp(env, timestamp);
   // A timestamp that was given but whose characters cannot be read fails the call rather than
   // being passed on as "no timestamp".
   if (timestamp != nullptr && stamp.get() == nullptr) return nullptr;
+  SessionRef s(handle, Access::kExclusive);
+  if (!s) return nullptr;
   return jni::shield<jstring>(nullptr, [&] {
     tessel::SecureBuffer out = tessel::contentOutput(*s, type, stamp.get());
     return jni::newJavaString(env, out);
@@ -63,30 +66,29 @@ JNIEXPORT jint JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_createNativeSession
 
 JNIEXPORT void JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_destroyNativeSession(JNIEnv*, jclass,
                                                                                   jint handle) {
-  if (sessionAt(handle) == nullptr) return;
-  jni::shieldVoid([&] { tessel::destroySession(handle); });
+  tessel::destroySession(handle);
 }
 
 // ---- keyboard surface
 
 JNIEXPORT void JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_setNativeSurfaceCreated(JNIEnv*, jclass,
                                                                                      jint handle) {
-  KeyboardSession* s = sessionAt(handle);
-  if (s == nullptr) return;
+  SessionRef s(handle);
+  if (!s) return;
   jni::shieldVoid([&] { tessel::mainSurfaceCreated(*s); });
 }
 
 JNIEXPORT void JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_setNativeSurfaceChanged(
     JNIEnv*, jclass, jint handle, jint width, jint height, jint variant) {
-  KeyboardSession* s = sessionAt(handle);
-  if (s == nullptr || width < 1 || height < 1) return;
+  SessionRef s(handle);
+  if (!s) return;
   jni::shieldVoid([&] { tessel::mainSurfaceChanged(*s, width, height, variant); });
 }
 
 JNIEXPORT void JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_setNativeDrawFrame(JNIEnv*, jclass,
                                                                                 jint handle) {
-  const KeyboardSession* s = sessionAt(handle);
-  if (s == nullptr) return;
+  SessionRef s(handle);
+  if (!s) return;
   jni::shieldVoid([&] { tessel::mainDrawFrame(*s); });
 }
 
@@ -94,23 +96,23 @@ JNIEXPORT void JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_setNativeDrawFrame(
 
 JNIEXPORT void JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_setNativePopSurfaceCreated(JNIEnv*, jclass,
                                                                                         jint handle) {
-  KeyboardSession* s = sessionAt(handle);
-  if (s == nullptr) return;
+  SessionRef s(handle);
+  if (!s) return;
   jni::shieldVoid([&] { tessel::popSurfaceCreated(*s); });
 }
 
 JNIEXPORT void JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_setNativePopSurfaceChanged(
     JNIEnv*, jclass, jint handle, jint width, jint height) {
-  KeyboardSession* s = sessionAt(handle);
-  if (s == nullptr || width < 1 || height < 1) return;
+  SessionRef s(handle);
+  if (!s) return;
   jni::shieldVoid([&] { tessel::popSurfaceChanged(*s, width, height); });
 }
 
 JNIEXPORT void JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_setNativePopDrawFrame(JNIEnv*, jclass,
                                                                                    jint handle,
                                                                                    jboolean showField) {
-  const KeyboardSession* s = sessionAt(handle);
-  if (s == nullptr) return;
+  SessionRef s(handle);
+  if (!s) return;
   jni::shieldVoid([&] { tessel::popDrawFrame(*s, showField != JNI_FALSE); });
 }
 
@@ -118,22 +120,22 @@ JNIEXPORT void JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_setNativePopDrawFra
 
 JNIEXPORT void JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_setNativePopTopSurfaceCreated(JNIEnv*, jclass,
                                                                                            jint handle) {
-  KeyboardSession* s = sessionAt(handle);
-  if (s == nullptr) return;
+  SessionRef s(handle);
+  if (!s) return;
   jni::shieldVoid([&] { tessel::popTopSurfaceCreated(*s); });
 }
 
 JNIEXPORT void JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_setNativePopTopSurfaceChanged(
     JNIEnv*, jclass, jint handle, jint width, jint height) {
-  KeyboardSession* s = sessionAt(handle);
-  if (s == nullptr || width < 1 || height < 1) return;
+  SessionRef s(handle);
+  if (!s) return;
   jni::shieldVoid([&] { tessel::popTopSurfaceChanged(*s, width, height); });
 }
 
 JNIEXPORT void JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_setNativePopTopDrawFrame(JNIEnv*, jclass,
                                                                                       jint handle) {
-  const KeyboardSession* s = sessionAt(handle);
-  if (s == nullptr) return;
+  SessionRef s(handle);
+  if (!s) return;
   jni::shieldVoid([&] { tessel::popTopDrawFrame(*s); });
 }
 
@@ -142,24 +144,25 @@ JNIEXPORT void JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_setNativePopTopDraw
 JNIEXPORT jint JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_setNativeTouchPos(JNIEnv*, jclass, jint handle,
                                                                                jint action, jfloat x,
                                                                                jfloat y) {
-  KeyboardSession* s = sessionAt(handle);
   // NaN passes every margin comparison and would reach the key arithmetic: refuse it here, as
   // a touch outside the surface is refused.
-  if (s == nullptr || std::isnan(x) || std::isnan(y)) return jni::kRefused;
+  if (std::isnan(x) || std::isnan(y)) return jni::kRefused;
+  SessionRef s(handle, Access::kExclusive);
+  if (!s) return jni::kRefused;
   return jni::shield<jint>(jni::kRefused, [&] { return tessel::touch(*s, action, x, y); });
 }
 
 JNIEXPORT jint JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_getNativeContentLen(JNIEnv*, jclass,
                                                                                  jint handle) {
-  const KeyboardSession* s = sessionAt(handle);
-  if (s == nullptr) return jni::kRefused;
+  SessionRef s(handle);
+  if (!s) return jni::kRefused;
   return tessel::contentLength(*s);
 }
 
 JNIEXPORT jint JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_clearNativePlaintext(JNIEnv*, jclass,
                                                                                   jint handle) {
-  KeyboardSession* s = sessionAt(handle);
-  if (s == nullptr || s->content == nullptr) return jni::kRefused;
+  SessionRef s(handle, Access::kExclusive);
+  if (!s) return jni::kRefused;
   tessel::clearContent(*s->content);
   return 0;
 }
@@ -180,8 +183,8 @@ JNIEXPORT jstring JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_getNativePinCont
 
 JNIEXPORT jshort JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_getNativeDegree(JNIEnv*, jclass,
                                                                                jint handle) {
-  KeyboardSession* s = sessionAt(handle);
-  if (s == nullptr) return jni::kRefused;
+  SessionRef s(handle, Access::kExclusive);
+  if (!s) return jni::kRefused;
   return jni::shield<jshort>(jni::kRefused, [&] {
     // The letter is a signed 8-bit value on every platform, widened with its sign.
     return static_cast<jshort>(static_cast<std::int8_t>(tessel::sessionDegree(*s)));
@@ -189,8 +192,8 @@ JNIEXPORT jshort JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_getNativeDegree(J
 }
 
 JNIEXPORT jint JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_getNativeVerify(JNIEnv*, jclass, jint handle) {
-  KeyboardSession* s = sessionAt(handle);
-  if (s == nullptr) return jni::kRefused;
+  SessionRef s(handle, Access::kExclusive);
+  if (!s) return jni::kRefused;
   // -4 is what verification reports when its rule cannot be built.
   return jni::shield<jint>(-4, [&] { return tessel::sessionVerify(*s); });
 }
@@ -208,16 +211,16 @@ JNIEXPORT jstring JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_getNativeStringV
 
 JNIEXPORT jstring JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_getNativeLastError(JNIEnv* env, jclass,
                                                                                    jint handle) {
-  const KeyboardSession* s = sessionAt(handle);
-  if (s == nullptr || s->content == nullptr) return nullptr;
+  SessionRef s(handle, Access::kExclusive);
+  if (!s) return nullptr;
   return jni::newJavaString(env, tessel::lastErrorText(s->content->lastError));
 }
 
 JNIEXPORT jbyteArray JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_getNativeEncryptedPinCode(JNIEnv* env,
                                                                                              jclass,
                                                                                              jint handle) {
-  KeyboardSession* s = sessionAt(handle);
-  if (s == nullptr) return nullptr;
+  SessionRef s(handle, Access::kExclusive);
+  if (!s) return nullptr;
   return jni::shield<jbyteArray>(nullptr, [&] {
     tessel::SecureBuffer code = tessel::encryptedPinCode(*s);
     return jni::newJavaBytes(env, code);
@@ -226,8 +229,8 @@ JNIEXPORT jbyteArray JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_getNativeEncr
 
 JNIEXPORT jstring JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_getNativeMeasureValue(JNIEnv* env, jclass,
                                                                                       jint handle) {
-  KeyboardSession* s = sessionAt(handle);
-  if (s == nullptr) return nullptr;
+  SessionRef s(handle, Access::kExclusive);
+  if (!s) return nullptr;
   return jni::shield<jstring>(nullptr, [&] {
     tessel::SecureBuffer value = tessel::computeMeasureValue(*s);
     return jni::newJavaString(env, value);

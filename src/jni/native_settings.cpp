@@ -1,7 +1,8 @@
 // Native entry points of QNKbdJniLib that configure a session (the setters and public keys).
 //
-// Same contract as native_session.cpp: the handle is resolved through sessionAt() and a bad one
-// (negative, 20 or more, or an empty slot) makes the call return at once, 0 for the public-key
+// Same contract as native_session.cpp: the handle is pinned exclusively through a SessionRef
+// (no setter replaces a string while an operation reads it) and a bad one (negative, 20 or
+// more, or an empty slot) makes the call return at once, 0 for the public-key
 // methods. A string argument that is null, or whose characters cannot be obtained, does the
 // same; the characters are released before returning. Managed types are narrowed here exactly
 // once: a jbyte keeps its low 8 bits with their sign, a jshort its 16 bits with their sign, a
@@ -16,7 +17,8 @@
 #include "session/settings.h"
 
 using tessel::KeyboardSession;
-using tessel::sessionAt;
+using tessel::Access;
+using tessel::SessionRef;
 namespace jni = tessel::jni;
 
 namespace {
@@ -26,27 +28,29 @@ constexpr jint kNotStored = 0;
 // Runs op(session, chars) for a live session and a readable string; otherwise does nothing.
 template <typename Op>
 void withText(JNIEnv* env, jint handle, jstring text, Op op) noexcept {
-  KeyboardSession* s = sessionAt(handle);
-  if (s == nullptr || text == nullptr) return;
+  if (text == nullptr || handle < 0) return;
   jni::Utf8Chars chars(env, text);
   if (chars.get() == nullptr) return;
+  SessionRef s(handle, Access::kExclusive);
+  if (!s) return;
   jni::shieldVoid([&] { op(*s, chars.get()); });
 }
 
 // The same for the public-key setters, which report 1 (taken) or 0 (refused).
 template <typename Op>
 jint keyText(JNIEnv* env, jint handle, jstring text, Op op) noexcept {
-  KeyboardSession* s = sessionAt(handle);
-  if (s == nullptr || text == nullptr) return kNotStored;
+  if (text == nullptr || handle < 0) return kNotStored;
   jni::Utf8Chars chars(env, text);
   if (chars.get() == nullptr) return kNotStored;
+  SessionRef s(handle, Access::kExclusive);
+  if (!s) return kNotStored;
   return jni::shield<jint>(kNotStored, [&] { return static_cast<jint>(op(*s, chars.get())); });
 }
 
 template <typename Op>
 void withSession(jint handle, Op op) noexcept {
-  KeyboardSession* s = sessionAt(handle);
-  if (s == nullptr) return;
+  SessionRef s(handle, Access::kExclusive);
+  if (!s) return;
   jni::shieldVoid([&] { op(*s); });
 }
 
@@ -132,12 +136,11 @@ JNIEXPORT void JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_setNativeContentTyp
 
 // The code is taken up to its first zero byte or the end of the array, whichever comes first,
 // and only when its first byte is non-zero. The array's elements are released (without copying
-// back) once the session holds its own copy.
+// back) as soon as the library holds its own copy.
 JNIEXPORT void JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_setNativeChallengeCode(JNIEnv* env, jclass,
                                                                                     jint handle,
                                                                                     jbyteArray code) {
-  KeyboardSession* s = sessionAt(handle);
-  if (s == nullptr || code == nullptr) return;
+  if (handle < 0 || code == nullptr) return;
   const jsize n = env->GetArrayLength(code);
   if (jni::clearPendingException(env) || n <= 0) return;
   jbyte* elements = env->GetByteArrayElements(code, nullptr);
@@ -145,12 +148,15 @@ JNIEXPORT void JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_setNativeChallengeC
     jni::clearPendingException(env);
     return;
   }
-  if (elements[0] != 0) {
-    // The managed array carries no terminator: the copy adds one.
-    tessel::SecureBuffer text = tessel::SecureBuffer::copyOf(elements, static_cast<std::size_t>(n));
-    if (text) jni::shieldVoid([&] { tessel::setChallengeCode(*s, text.c_str()); });
-  }
+  // The managed array carries no terminator: the copy adds one. It is made before the session
+  // is pinned, so no JNI call runs while the session's opLock is held.
+  tessel::SecureBuffer text;
+  if (elements[0] != 0) text = tessel::SecureBuffer::copyOf(elements, static_cast<std::size_t>(n));
   env->ReleaseByteArrayElements(code, elements, JNI_ABORT);
+  if (!text) return;
+  SessionRef s(handle, Access::kExclusive);
+  if (!s) return;
+  jni::shieldVoid([&] { tessel::setChallengeCode(*s, text.c_str()); });
 }
 
 JNIEXPORT void JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_setNativeKbdFactor(JNIEnv* env, jclass,
@@ -241,12 +247,13 @@ JNIEXPORT jint JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_setNativePublicKeyB
 JNIEXPORT jint JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_setNativePublicKeyECC(JNIEnv* env, jclass,
                                                                                    jint handle, jstring x,
                                                                                    jstring y) {
-  KeyboardSession* s = sessionAt(handle);
-  if (s == nullptr || x == nullptr || y == nullptr) return kNotStored;
+  if (x == nullptr || y == nullptr) return kNotStored;
   jni::Utf8Chars xChars(env, x);
   if (xChars.get() == nullptr) return kNotStored;
   jni::Utf8Chars yChars(env, y);
   if (yChars.get() == nullptr) return kNotStored;
+  SessionRef s(handle, Access::kExclusive);
+  if (!s) return kNotStored;
   return jni::shield<jint>(kNotStored, [&] { return tessel::setEccKey(*s, xChars.get(), yChars.get()); });
 }
 

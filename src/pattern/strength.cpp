@@ -253,7 +253,6 @@ void freeDictionary(char** list) noexcept {
 
 bool buildPasswordRule(const KeyboardSession& session, PasswordRule* rule) noexcept {
   *rule = PasswordRule{};
-  if (session.content == nullptr) return false;
   if (!parseDictionary(session.content->dictionaryFilter, &rule->dictionary)) return false;
   rule->minLength = static_cast<std::uint32_t>(static_cast<std::int32_t>(session.minLength));
   rule->acceptsPattern = session.accepts;
@@ -269,7 +268,6 @@ void releasePasswordRule(PasswordRule& rule) noexcept {
 // ---- session operations
 
 char sessionDegree(KeyboardSession& session) {
-  if (session.content == nullptr) return rateStrength(48, "");
   ContentGuard guard(*session.content);
   guard.text()[guard.length()] = 0;  // already the terminator; stated, not assumed
   return rateStrength(48, reinterpret_cast<const char*>(guard.text()));

@@ -42,6 +42,15 @@ inline float floatFromBits(std::uint32_t bits) {
 // unless told otherwise, resets the model-view to identity.
 void drawQuad(GLuint texture, const GLfloat* texCoords, bool resetMatrix = true);
 
+// The aspect correction that keeps glyphs and icons undistorted on a key of aspect keyAspect:
+// S(1 / keyAspect, 2) in surface mode 1, S(1, 2 keyAspect) otherwise.
+inline void aspect(bool mode1, float keyAspect) {
+  if (mode1)
+    S(1.0f / keyAspect, 2.0f);
+  else
+    S(1.0f, 2.0f * keyAspect);
+}
+
 // glEnable(GL_BLEND) with src-alpha / one-minus-src-alpha; endBlend disables it.
 void beginBlend();
 void endBlend();

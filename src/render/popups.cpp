@@ -52,12 +52,7 @@ bool topRowHeld(const KeyboardSession& s) {
          s.keyReleased[3] != 1 && s.touchRow == 0;
 }
 
-void aspect(const KeyboardSession& s) {
-  if (s.surfaceMode == 1)
-    S(1.0f / s.keyAspect, 2.0f);
-  else
-    S(1.0f, 2.0f * s.keyAspect);
-}
+void aspect(const KeyboardSession& s) { render::aspect(s.surfaceMode == 1, s.keyAspect); }
 
 float topRowX(std::uint32_t column) { return 2.0f * static_cast<float>(column) - 9.0f; }
 
@@ -77,7 +72,7 @@ void drawField(const KeyboardSession& s) {
 
   // Dots and cursor on a grid of 1/20 of the width, sized by the keyboard's key aspect.
   const int limit = pad ? 18 : 19;
-  const int length = s.content != nullptr ? static_cast<int>(s.content->length.load()) : 0;
+  const int length = static_cast<int>(s.content->length.load());
   const int n = length < limit ? length : limit;
   const float r = (static_cast<float>(s.surfaceWidth.load()) / 10.0f) /
                   (static_cast<float>(s.surfaceHeight.load()) * 0.25f);
@@ -156,7 +151,7 @@ void popTopDrawFrame(const KeyboardSession& s) {
   render::clearFrame();
   const std::uint32_t c = s.touchColumn;
   if (!topRowHeld(s) || c >= 10) return;
-  const PopTopTextureSet& t = popTopTextures();
+  const PopTopTextureSet& t = s.popTopTextures;
   // The top pop-up holds first-page symbols only: the second page shows the first page's glyph.
   const TextureName& glyph = s.symbolPage != 0 ? t.symbols[c] : (s.shiftOn != 0 ? t.shiftedLetters[c] : t.letters[c]);
   render::beginBlend();

@@ -41,12 +41,7 @@ struct Frame {
     S(0.953125f, 0.92611f);
     S(2.5f * columnFraction, rowFraction);
   }
-  void aspect() const {
-    if (mode1)
-      S(1.0f / keyAspect, 2.0f);
-    else
-      S(1.0f, 2.0f * keyAspect);
-  }
+  void aspect() const { render::aspect(mode1, keyAspect); }
   void padAspect(float y) const { S(padAspectX(mode1), y); }
   // Switch and done labels: wide aspect factors.
   void labelAspect() const {
@@ -360,7 +355,7 @@ void mainSurfaceChanged(KeyboardSession& s, int width, int height, int variant) 
 }
 
 void mainDrawFrame(const KeyboardSession& s) {
-  const MainTextureSet& t = mainTextures();
+  const MainTextureSet& t = s.mainTextures;
   render::clearFrame();
   render::drawBackground(name(t.backgroundTexture));
   const Frame f{s, t, s.surfaceMode == 1, s.columnFraction, s.rowFraction, s.keyAspect};

@@ -1,10 +1,10 @@
 // The three GL surfaces: keyboard, field pop-up and top pop-up. Called on the app's GL threads
-// with a current OpenGL ES 1.x context; the caller has looked the session up (an empty slot or
-// a negative handle never gets here).
+// with a current OpenGL ES 1.x context; the caller has pinned the session (an empty slot or a
+// negative handle never gets here).
 //
 // Created: GL state (smooth shading, 2D textures, depth test LEQUAL, nicest perspective hint,
-// vertex and texture-coordinate arrays) and a fresh, process-wide texture set for that surface
-// kind (render/textures.h). The keyboard's and the top pop-up's creation also build the key
+// vertex and texture-coordinate arrays) and a fresh texture set for that surface
+// (render/textures.h). The keyboard's and the top pop-up's creation also build the key
 // layout (input/layout.h), holding s.lock around build and upload, so creating either may be
 // what reshuffles the keys.
 // Changed: width or height below 1 does nothing. The keyboard's applies the grid geometry

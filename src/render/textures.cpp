@@ -1,4 +1,4 @@
-// Texture upload and the three process-wide texture sets. The upload lists follow one fixed
+// Texture upload and the three texture sets. The upload lists follow one fixed
 // order per surface; the glyph entries follow the session's layout.
 #include "render/textures.h"
 
@@ -13,9 +13,7 @@ namespace tessel {
 
 namespace {
 
-MainTextureSet gMain;
 PopTextureSet gPop;
-PopTopTextureSet gPopTop;
 
 constexpr int kMaxEntry = 26;
 
@@ -60,9 +58,7 @@ void uploadPositional(TextureName* out, int count, const ImageGroup& group,
 
 }  // namespace
 
-MainTextureSet& mainTextures() noexcept { return gMain; }
 PopTextureSet& popTextures() noexcept { return gPop; }
-PopTopTextureSet& popTopTextures() noexcept { return gPopTop; }
 
 void uploadTexture(std::uint32_t name, const TextureImage& image) noexcept {
   glBindTexture(GL_TEXTURE_2D, name);
@@ -74,8 +70,8 @@ void uploadTexture(std::uint32_t name, const TextureImage& image) noexcept {
   glTexImage2D(GL_TEXTURE_2D, 0, GL_RGBA, image.width, image.height, 0, GL_RGBA, GL_UNSIGNED_BYTE, image.pixels);
 }
 
-void uploadMainTextures(const KeyboardSession& s) noexcept {
-  MainTextureSet& t = gMain;
+void uploadMainTextures(KeyboardSession& s) noexcept {
+  MainTextureSet& t = s.mainTextures;
   const std::uint8_t mask = s.keyMask;
   uploadPlain(t.backgroundTexture, images::kBackgroundPixels);
   uploadGroup(t.charKeyTextures, images::kCharKeys);
@@ -106,8 +102,8 @@ void uploadPopTextures() noexcept {
   uploadEntry(&t.balloon, 1, [](int) { return &images::kCharKeys[2]; });
 }
 
-void uploadPopTopTextures(const KeyboardSession& s) noexcept {
-  PopTopTextureSet& t = gPopTop;
+void uploadPopTopTextures(KeyboardSession& s) noexcept {
+  PopTopTextureSet& t = s.popTopTextures;
   const std::uint8_t mask = s.keyMask;
   uploadPositional(t.letters, 10, images::kLetterGlyphs, s.letters, mask);
   uploadPositional(t.shiftedLetters, 10, images::kShiftedLetterGlyphs, s.letters, mask);

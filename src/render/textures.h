@@ -1,11 +1,12 @@
-// GL textures of the three surfaces: uploadTexture and the three process-wide texture sets.
+// GL textures of the three surfaces: uploadTexture and the three texture sets.
 //
-// Each surface kind has one set of texture names for the whole process (not per session).
-// Every creation of that surface, whatever the session, generates fresh names (one
-// glGenTextures per entry of the upload list, before the entry's textures are filled) and
-// overwrites the set; old names are never deleted, they go with the GL context that the app
-// recreates. The names are stored as relaxed atomics: a surface of another session may be
-// drawing from the set on another GL thread while it is replaced.
+// The keyboard's and the top pop-up's texture sets belong to the session (their glyph entries
+// follow its layout, so two keyboards drawn in one GL context must not share them); the field
+// pop-up's set, which depends on no layout, is one for the whole process. Every creation of a
+// surface generates fresh names (one glGenTextures per entry of the upload list, before the
+// entry's textures are filled) and overwrites its set; old names are never deleted, they go
+// with the GL context that the app recreates. The names are stored as relaxed atomics: a frame
+// may be drawing from a set on another GL thread while it is replaced.
 //
 // Glyph entries are positional: element i shows the character that the session's layout holds
 // at position i at upload time. The stored (masked) byte is unmasked only for the lookup of its
@@ -58,9 +59,7 @@ struct PopTopTextureSet {
   TextureName symbols[10];        // first symbol page
 };
 
-MainTextureSet& mainTextures() noexcept;
 PopTextureSet& popTextures() noexcept;
-PopTopTextureSet& popTopTextures() noexcept;
 
 // Binds `name` and fills it from the image: MIN_FILTER nearest, MAG_FILTER linear, both wraps
 // clamp-to-edge (set with glTexParameterf, in that order), texture environment replace, then
@@ -71,8 +70,8 @@ void uploadTexture(std::uint32_t name, const TextureImage& image) noexcept;
 // The upload lists (GL context current; the session's layout built for the positional glyphs).
 // A layout byte that does not unmask to a character of the glyph tables leaves its texture
 // name generated but empty.
-void uploadMainTextures(const KeyboardSession& session) noexcept;
+void uploadMainTextures(KeyboardSession& session) noexcept;
 void uploadPopTextures() noexcept;
-void uploadPopTopTextures(const KeyboardSession& session) noexcept;
+void uploadPopTopTextures(KeyboardSession& session) noexcept;
 
 }  // namespace tessel

@@ -5,17 +5,26 @@
 // lives in ContentStore::plaintext and is RC4-sealed whenever no operation is running and the
 // length is non-zero (PlaintextSeal, below); ContentGuard is how every operation gets at it.
 //
-// Threads: the UI thread creates, configures, touches and reads output; each GL thread draws.
-// Fields that both sides use without a lock are RelaxedField (see relaxed_field.h). `lock` is
-// taken only around layout building and texture upload in the surface-created handlers.
+// Threads: any entry point may arrive on any thread. Three rules keep that safe:
+//   - Lifetime: every call works on a SessionRef, which pins the session it found. Destroy and
+//     eviction unlink the slot at once; the session is wiped and freed by whoever drops the
+//     last pin (the table's own, or a call still in progress).
+//   - The text: setters, touches and every operation that unseals the text hold `opLock` for
+//     the whole call (SessionRef with Access::kExclusive), so nobody sees or reseals half-sealed
+//     bytes and no string is replaced while an operation reads it.
+//   - Frames and surface callbacks never take `opLock`: they read only RelaxedField values
+//     (relaxed_field.h), which may be a mix of old and new, never torn. `lock` is taken only
+//     around layout building and texture upload in the surface-created handlers.
 #pragma once
 
+#include <atomic>
 #include <cstddef>
 #include <cstdint>
 #include <mutex>
 
 #include "crypto/error_table.h"
 #include "crypto/rc4.h"
+#include "render/textures.h"
 #include "session/relaxed_field.h"
 
 namespace tessel {
@@ -80,8 +89,14 @@ struct KeyboardSession {
   char* appPlat = nullptr;
   char* encryPlat = nullptr;
   char* eccKey = nullptr;
-  ContentStore* content = nullptr;
-  std::recursive_mutex lock;
+  ContentStore* content = nullptr;                  // set for the whole life of the session
+  std::recursive_mutex lock;                        // layout build + texture upload
+  std::mutex opLock;                                // one text operation or setter at a time
+  std::atomic<int> pins{1};                         // the table's reference + calls in progress
+  // This keyboard's own texture names: two keyboards whose surfaces share one GL context each
+  // draw their own layout. The field pop-up's images depend on no layout and stay process-wide.
+  MainTextureSet mainTextures;
+  PopTopTextureSet popTopTextures;
 };
 
 // ---- the table
@@ -91,15 +106,44 @@ struct KeyboardSession {
 // Returns the slot, or -1 for a null name or when memory runs out.
 int createSession(const char* name) noexcept;
 
-// Releases the session in slot `handle`; out-of-range handles and empty slots are ignored.
+// Unlinks the session in slot `handle` at once (the slot is free for the next create) and drops
+// the table's pin; out-of-range handles and empty slots are ignored. Calls still working on the
+// session finish first; the last of them frees it.
 void destroySession(int handle) noexcept;
 
-// The live session of a slot, or null for a negative, out-of-range or empty handle. Every
-// operation starts here, so an empty slot is refused exactly like a negative handle.
+// The live session of a slot, unpinned: null for a negative, out-of-range or empty handle.
+// Only for a caller that is the one thread able to destroy or evict it (a tool, a test, a
+// fuzzer driving one thread); the entry points use SessionRef.
 KeyboardSession* sessionAt(int handle) noexcept;
 
-// Slot most recently filled by a create (-1 before the first).
-int lastCreatedSlot() noexcept;
+enum class Access {
+  kShared,     // frames, surface callbacks, the length: relaxed fields only
+  kExclusive,  // setters, touches, outputs: also holds the session's opLock
+};
+
+// The live session of a slot, pinned for the lifetime of this object; null for a negative,
+// out-of-range or empty handle, so an empty slot is refused exactly like a negative one.
+// Every entry point starts here. Movable, not copyable.
+class SessionRef {
+ public:
+  SessionRef() noexcept = default;
+  explicit SessionRef(int handle, Access access = Access::kShared) noexcept;
+  SessionRef(SessionRef&& other) noexcept;
+  SessionRef& operator=(SessionRef&& other) noexcept;
+  SessionRef(const SessionRef&) = delete;
+  SessionRef& operator=(const SessionRef&) = delete;
+  ~SessionRef() { reset(); }
+
+  KeyboardSession* get() const noexcept { return session_; }
+  KeyboardSession& operator*() const noexcept { return *session_; }
+  KeyboardSession* operator->() const noexcept { return session_; }
+  explicit operator bool() const noexcept { return session_ != nullptr; }
+  void reset() noexcept;
+
+ private:
+  KeyboardSession* session_ = nullptr;
+  bool exclusive_ = false;
+};
 
 // ---- the sealed text
 
@@ -108,7 +152,8 @@ int lastCreatedSlot() noexcept;
 void applySeal(ContentStore& store) noexcept;
 
 // Scoped access to the plaintext: unseals on entry if length != 0 and, on every way out,
-// reseals if length (after the work) != 0. All reads and edits of the text go through one.
+// reseals if length (after the work) != 0. All reads and edits of the text go through one, and
+// only while the session's opLock is held (SessionRef with Access::kExclusive).
 class ContentGuard {
  public:
   explicit ContentGuard(ContentStore& store) noexcept;
@@ -125,7 +170,7 @@ class ContentGuard {
 // length = 0 and both 4093-byte areas zeroed.
 void clearContent(ContentStore& store) noexcept;
 
-// The content length, sign-extended from 16 bits, without unsealing.
+// The content length, sign-extended from 16 bits, without unsealing or locking.
 int contentLength(const KeyboardSession& session) noexcept;
 
 // ---- owned strings (malloc'd, wiped before free)

@@ -223,8 +223,8 @@ void deleteNames(const TextureName& name) { deleteNames(&name, 1); }
 // An app's surfaces lose their GL context with the keyboard, and their textures with it; the
 // demo keeps one context, so it deletes the three sets' textures before the surfaces are
 // created again.
-void deleteSurfaceTextures() {
-  const MainTextureSet& m = mainTextures();
+void deleteSurfaceTextures(const KeyboardSession& s) {
+  const MainTextureSet& m = s.mainTextures;
   deleteNames(m.backgroundTexture);
   deleteNames(m.charKeyTextures);
   deleteNames(m.letterTextures);
@@ -245,7 +245,7 @@ void deleteSurfaceTextures() {
   deleteNames(m.padDigitTextures);
   const PopTextureSet& p = popTextures();
   for (const TextureName* name : {&p.background, &p.frame, &p.dot, &p.cursor, &p.balloon}) deleteNames(*name);
-  const PopTopTextureSet& t = popTopTextures();
+  const PopTopTextureSet& t = s.popTopTextures;
   deleteNames(t.letters);
   deleteNames(t.shiftedLetters);
   deleteNames(t.symbols);
@@ -387,7 +387,7 @@ int runWindow(KeyboardSession& s, const server::OpenKeys& keys, const WindowOpti
       state.doneReleased = false;
       reportDone(s, keys, ++dones);
       // Shown again, as an app shows its keyboard once more: new surfaces, a new layout.
-      deleteSurfaceTextures();
+      deleteSurfaceTextures(s);
       createSurfaces(s);
       changeSurfaces(s, state, overlay);
       drawFrame(s, state, overlay);
