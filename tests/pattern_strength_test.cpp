@@ -369,9 +369,4 @@ TEST(StrengthSession, DegreeAndVerifyFromTheSettingsReseal) {
   s.minLength = 7;
   EXPECT_EQ(sessionVerify(s), -2);
   releaseOwnedText(s.content->dictionaryFilter);  // the session's release deliberately keeps it
-  KeyboardSession bare;  // no content store: the rule cannot be built
-  EXPECT_EQ(sessionVerify(bare), -4);
-  PasswordRule rule;
-  EXPECT_FALSE(buildPasswordRule(bare, &rule));
-  EXPECT_EQ(rule.dictionary, nullptr);
 }

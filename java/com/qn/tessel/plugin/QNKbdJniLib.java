@@ -14,10 +14,14 @@ package com.qn.tessel.plugin;
  * returns the slot number (0..19), the <em>handle</em> that every other method takes first.
  * Creating again with the same name returns the same handle and leaves the typed text intact.
  * When all 20 slots are taken, a new name evicts the slot after the one created last (slot 0
- * after 19), so a handle you keep may come to belong to another keyboard: destroy sessions you
- * no longer need. A handle that is negative, 20 or more, or whose slot is empty is refused by
- * every method with the value documented for it (-1, 0, {@code null} or nothing); the two
- * version getters answer for any non-negative handle. No method throws.
+ * after 19) and reuses its number. A handle is only a slot number, so a handle you kept across
+ * that eviction now drives the other keyboard, and nothing can tell the two apart. The safe
+ * pattern: call {@link #createNativeSession} with the keyboard's name each time the keyboard is
+ * shown and use the handle it returns; a session that was evicted then comes back as a new, empty
+ * one instead of another screen's. Destroy sessions you no longer need. A handle that is
+ * negative, 20 or more, or whose slot is empty is refused by every method with the value
+ * documented for it (-1, 0, {@code null} or nothing); the two version getters answer for any
+ * non-negative handle. No method throws.
  *
  * <h2>Call order</h2>
  * <ol>
@@ -38,15 +42,27 @@ package com.qn.tessel.plugin;
  * refused.
  *
  * <h2>Threads and locking</h2>
- * Call create, destroy, the setters, {@link #setNativeTouchPos} and the getters from your UI
- * thread. Call each surface's three callbacks from that surface's GL renderer thread, with its
- * EGL context current (one thread per surface). The only lock is a per-session recursive lock
- * taken by {@link #setNativeSurfaceCreated} and {@link #setNativePopTopSurfaceCreated} around the
- * key-layout build and texture upload, so two surfaces created at once build the layout once.
- * Touches, setters, getters and draw-frame calls take no lock: a frame may show a mix of the
- * previous and the current touch state, which is harmless. Stop the renderers (for example
- * {@code GLSurfaceView.onPause()}) before {@link #destroyNativeSession}: destroying a session while
- * one of its surfaces is drawing frees memory the renderer is reading.
+ * Every method may be called from any thread. The intended split is create, destroy, the
+ * setters, {@link #setNativeTouchPos} and the getters on your UI thread, and each surface's
+ * three callbacks on that surface's GL renderer thread with its EGL context current. What the
+ * library guarantees for any other split:
+ * <ul>
+ * <li>A call that found its session keeps it alive until it returns. Destroying or evicting a
+ *     session frees its slot at once; the session itself is wiped and freed when the last call
+ *     still working on it returns. A call that arrives after that is refused like a bad handle.
+ *     So a renderer that draws one more frame after {@link #destroyNativeSession} is harmless.</li>
+ * <li>Touches, setters and the getters that read the text run one at a time per session: two
+ *     threads reading outputs at once both get correct results and the text is never changed by
+ *     it. A call may wait for another one on the same session (at most one output operation,
+ *     some tens of microseconds).</li>
+ * <li>Frames, surface callbacks and {@link #getNativeContentLen} never wait for those: a frame
+ *     may show a mix of the previous and the current touch state, which is harmless. A
+ *     per-session lock is taken by {@link #setNativeSurfaceCreated} and
+ *     {@link #setNativePopTopSurfaceCreated} around the key-layout build and texture upload, so
+ *     two surfaces created at once build the layout once.</li>
+ * <li>Each keyboard has its own textures, so two keyboards whose surfaces share one GL context
+ *     each show their own keys.</li>
+ * </ul>
  *
  * <h2>Loading the library</h2>
  * The class loads the library when it is initialised: from the absolute path in the system
@@ -139,7 +155,14 @@ public final class QNKbdJniLib {
   // ---------------------------------------------------------------- sessions
 
   /**
-   * Finds the session called {@code name} or creates it. UI thread.
+   * Finds the session called {@code name} or creates it. When all 20 slots are taken, creating a
+   * new name evicts the slot after the one created last and returns that slot's number, so a
+   * handle kept from before may now belong to the new keyboard. Resolve the handle by name each
+   * time the keyboard is shown, for example in {@code onResume}:
+   * <pre>{@code
+   * handle = QNKbdJniLib.createNativeSession("login-password");  // same session while it lives
+   * QNKbdJniLib.setNativeMaxLength(handle, (short) 16);  // settings may be applied again
+   * }</pre>
    *
    * @param name any text identifying the keyboard (for example the field's id)
    * @return the handle 0..19; the same handle for the same name while the session lives; -1 when
@@ -148,8 +171,9 @@ public final class QNKbdJniLib {
   public static native int createNativeSession(String name);
 
   /**
-   * Releases the session and wipes its text and keys. Stop the session's renderers first. Bad
-   * handles are ignored. UI thread.
+   * Releases the session and wipes its text and keys. The slot is free at once; calls still
+   * working on the session (a frame being drawn, an output being made) finish first, and the
+   * last of them frees it. Bad handles are ignored.
    */
   public static native void destroyNativeSession(int handle);
 

@@ -155,5 +155,19 @@ final class EntryPointTests {
       Check.equal(0, createNativeSession("s5"), "after destroying all, slot 0 first");
       JvmSuite.destroyAll();
     });
+
+    Check.test("a handle kept across eviction drives the successor; one resolved by name does not", () -> {
+      JvmSuite.destroyAll();
+      final int login = createNativeSession("login-password");
+      for (int k = 1; k < SESSION_SLOTS; ++k) createNativeSession("screen" + k);
+      final int pin = createNativeSession("transfer-pin");
+      Check.equal(login, pin, "the 21st name takes the kept handle's slot");
+      getNativeContent(login, null);  // through the kept handle: refused for the missing timestamp
+      Check.equal("The timestamp is missing!", getNativeLastError(pin), "the kept handle reached the PIN session");
+      final int resolved = createNativeSession("login-password");
+      Check.equal(true, resolved != pin, "resolved by name: a session of its own");
+      Check.equal("No Error!", getNativeLastError(resolved), "and a fresh one");
+      JvmSuite.destroyAll();
+    });
   }
 }
