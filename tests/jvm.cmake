@@ -1,8 +1,8 @@
 # Suites that check libTesselVIP.so from the outside (included by tests/CMakeLists.txt):
 #   jni_exports     the dynamic symbol table holds exactly the 51 native methods of QNKbdJniLib;
 #   jvm_suite       a real JVM loads the library and drives keyboards through QNKbdJniLib only,
-#                   with GL surfaces on offscreen GLES 1.1 contexts (libtessel_egl_test.so) and
-#                   the outputs opened by the server-side tool (tessel_open);
+#                   with GL surfaces on offscreen GLES 1.1 contexts (libtessel_egl_test.so), and
+#                   opens the outputs with both server-side openers (tessel_open, tessel-server.jar);
 # plus the build-time check that the native entry points match the header javac -h writes.
 if(NOT TARGET TesselVIP OR NOT TARGET tessel_java)
   message(STATUS "libTesselVIP.so or the managed class is not built: JVM suites skipped")
@@ -27,8 +27,8 @@ add_test(NAME jni_exports
           -P "${TESSEL_JVM_DIR}/check_exports.cmake")
 set_tests_properties(jni_exports PROPERTIES TIMEOUT 60)
 
-if(NOT TESSEL_EGL_LIBRARY OR NOT TARGET tessel_open OR NOT Java_JAVA_EXECUTABLE)
-  message(STATUS "EGL, tessel_open or a Java runtime missing: jvm_suite skipped")
+if(NOT TESSEL_EGL_LIBRARY OR NOT TARGET tessel_open OR NOT TARGET tessel_server_java OR NOT Java_JAVA_EXECUTABLE)
+  message(STATUS "EGL, an opener or a Java runtime missing: jvm_suite skipped")
   return()
 endif()
 
@@ -37,10 +37,17 @@ add_library(tessel_egl_test SHARED "${TESSEL_JVM_DIR}/native/egl_helper.cpp")
 target_include_directories(tessel_egl_test PRIVATE ${TESSEL_JNI_INCLUDE} ${TESSEL_JNI_MD_HINT})
 target_link_libraries(tessel_egl_test PRIVATE ${TESSEL_EGL_LIBRARY} ${TESSEL_GLES_LIBRARY})
 target_compile_options(tessel_egl_test PRIVATE ${TESSEL_WARNINGS})
+# Test-only JNI helper: the core's dispatcher for the types the native methods do not pass.
+add_library(tessel_dispatch_test SHARED "${TESSEL_JVM_DIR}/native/dispatch_helper.cpp")
+target_include_directories(tessel_dispatch_test PRIVATE ${TESSEL_JNI_INCLUDE} ${TESSEL_JNI_MD_HINT})
+target_link_libraries(tessel_dispatch_test PRIVATE tessel_core)
+target_link_options(tessel_dispatch_test PRIVATE "-Wl,--exclude-libs,ALL")
+target_compile_options(tessel_dispatch_test PRIVATE ${TESSEL_WARNINGS})
 
 file(GLOB TESSEL_JVM_SOURCES CONFIGURE_DEPENDS "${TESSEL_JVM_DIR}/com/qn/tessel/test/*.java")
 set(CMAKE_JAVA_COMPILE_FLAGS -encoding UTF-8 -Xlint:all -Xlint:-options -Werror)
-add_jar(tessel_jvm_tests SOURCES ${TESSEL_JVM_SOURCES} INCLUDE_JARS tessel_java OUTPUT_NAME TesselJvmTests)
+add_jar(tessel_jvm_tests SOURCES ${TESSEL_JVM_SOURCES} INCLUDE_JARS tessel_java tessel_server_java
+        OUTPUT_NAME TesselJvmTests)
 get_target_property(TESSEL_JVM_TESTS_JAR tessel_jvm_tests JAR_FILE)
 get_target_property(TESSEL_JAVA_JAR_FILE tessel_java JAR_FILE)
 
@@ -50,10 +57,11 @@ add_test(NAME jvm_suite
   COMMAND ${Java_JAVA_EXECUTABLE} -Xcheck:jni
           -Dtessel.library=$<TARGET_FILE:TesselVIP>
           -Dtessel.eglHelper=$<TARGET_FILE:tessel_egl_test>
+          -Dtessel.dispatchHelper=$<TARGET_FILE:tessel_dispatch_test>
           -Dtessel.server=$<TARGET_FILE:tessel_open>
           -Dtessel.appKey=${CMAKE_CURRENT_LIST_DIR}/data/builtin_default_key.pem
           -Dtessel.tmp=${TESSEL_JVM_TMP}
-          -cp "${TESSEL_JVM_TESTS_JAR}:${TESSEL_JAVA_JAR_FILE}"
+          -cp "${TESSEL_JVM_TESTS_JAR}:${TESSEL_JAVA_JAR_FILE}:${TESSEL_SERVER_JAR}"
           com.qn.tessel.test.JvmSuite)
 set_tests_properties(jvm_suite PROPERTIES TIMEOUT 300
   FAIL_REGULAR_EXPRESSION "WARNING in native method|FATAL ERROR in native method")

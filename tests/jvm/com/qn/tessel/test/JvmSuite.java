@@ -3,20 +3,27 @@ package com.qn.tessel.test;
 import static com.qn.tessel.plugin.QNKbdJniLib.*;
 
 import com.qn.tessel.plugin.QNKbdJniLib;
+import com.qn.tessel.server.PemKeys;
+import com.qn.tessel.server.TesselOpener;
 import java.io.File;
 import java.nio.charset.StandardCharsets;
 import java.nio.file.Files;
+import java.nio.file.Path;
 import java.security.KeyPair;
 import java.security.KeyPairGenerator;
+import java.security.PrivateKey;
+import java.security.interfaces.RSAPrivateKey;
 import java.security.interfaces.RSAPublicKey;
+import java.util.Locale;
 
 /**
  * The JVM suite: loads the built libTesselVIP.so into a real JVM and drives keyboards only
  * through com.qn.tessel.plugin.QNKbdJniLib, as an app does. Run by CTest (tests/jvm.cmake) with
  * the paths it needs as system properties:
  *   tessel.library     libTesselVIP.so                tessel.eglHelper  libtessel_egl_test.so
- *   tessel.server      the tessel_open opener         tessel.appKey     builtin_default_key.pem
+ *   tessel.server      the C++ opener tessel_open     tessel.appKey     builtin_default_key.pem
  *   tessel.tmp         a scratch directory
+ *   tessel.dispatchHelper  libtessel_dispatch_test.so
  * Exit status 0 when every check passed.
  */
 public final class JvmSuite {
@@ -25,10 +32,10 @@ public final class JvmSuite {
   static final int HEIGHT = 320;
   static final String TIMESTAMP = "20260101120000";
 
-  static ServerTool server;
-  static String encKeyPem;
+  static String appModulusHex;
   static String encModulusHex;
   static RSAPublicKey encPublicKey;
+  static TesselOpener opener;
 
   private JvmSuite() {}
 
@@ -63,15 +70,15 @@ public final class JvmSuite {
     });
   }
 
-  /** The typed text as the bank's server reads it from getNativeContent (type 48). */
+  /** The typed text as the bank's server reads it from getNativeContent (type 48), by both openers. */
   static String serverContent(int h) throws Exception {
     String out = getNativeContent(h, TIMESTAMP);
     if (out == null) {
       Check.fail("getNativeContent returned null: " + getNativeLastError(h));
       return null;
     }
-    ServerTool.Result r = server.open(48, out, null);
-    Check.equal(0, r.exitCode, "tessel_open type 48 " + r);
+    Openers.Result r = Openers.open(48, out, false);
+    Check.equal(0, r.exit(), "type 48 opened: " + r.stderr());
     Check.equal(TIMESTAMP, r.get("timestamp"), "timestamp in the envelope");
     return r.get("content");
   }
@@ -81,7 +88,10 @@ public final class JvmSuite {
     // The library is loaded here, before the class is initialised: its own System.loadLibrary
     // then fails (the build directory is not on java.library.path) and must not matter.
     System.load(property("tessel.library"));
-    server = new ServerTool(property("tessel.server"), property("tessel.appKey"));
+    Openers.cppTool = property("tessel.server");
+    Openers.appKeyPem = property("tessel.appKey");
+    PrivateKey app = PemKeys.read(Path.of(Openers.appKeyPem));
+    appModulusHex = ((RSAPrivateKey) app).getModulus().toString(16).toUpperCase(Locale.ROOT);
     KeyPairGenerator generator = KeyPairGenerator.getInstance("RSA");
     generator.initialize(1024);
     KeyPair enc = generator.generateKeyPair();
@@ -89,7 +99,8 @@ public final class JvmSuite {
     encModulusHex = Oracles.modulusHex(encPublicKey);
     File pem = new File(property("tessel.tmp"), "enc_platform_key.pem");
     Files.write(pem.toPath(), Oracles.pkcs8Pem(enc.getPrivate()).getBytes(StandardCharsets.US_ASCII));
-    encKeyPem = pem.getPath();
+    Openers.encKeyPem = pem.getPath();
+    opener = TesselOpener.builder().appKey(app).encKey(enc.getPrivate()).build();
   }
 
   public static void main(String[] args) throws Exception {
@@ -102,6 +113,7 @@ public final class JvmSuite {
     KeyboardTests.run();
     OutputTests.run();
     RenderTests.run();
+    DispatcherTypes.run();
     destroyAll();
     System.out.printf("%d checks, %d failed%n", Check.checks(), Check.failures());
     System.exit(Check.failures() == 0 ? 0 : 1);

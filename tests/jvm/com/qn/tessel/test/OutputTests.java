@@ -7,7 +7,12 @@ import static com.qn.tessel.test.JvmSuite.HEIGHT;
 import static com.qn.tessel.test.JvmSuite.keyboard;
 import static com.qn.tessel.test.JvmSuite.serverContent;
 
+import com.qn.tessel.server.EncryptedPinCode;
+import com.qn.tessel.server.OpenException;
+import com.qn.tessel.server.Opened;
+import com.qn.tessel.server.PasswordCheck;
 import java.math.BigInteger;
+import java.util.Base64;
 
 /**
  * What an app gets out of a session, checked against independent parties: the envelopes of
@@ -19,16 +24,35 @@ import java.math.BigInteger;
 final class OutputTests {
   private OutputTests() {}
 
-  /** Opens getNativePinContent (type 47) with both keys; returns the opened content or null. */
+  /** Opens getNativePinContent (type 47) with both openers; returns the opened content or null. */
   static String pinContent(KeyboardDriver k) throws Exception {
     String out = getNativePinContent(k.handle, TIMESTAMP);
     if (out == null) return null;
-    ServerTool.Result r = JvmSuite.server.open(47, out, JvmSuite.encKeyPem);
-    Check.equal(0, r.exitCode, "tessel_open type 47 " + r);
+    Openers.Result r = Openers.open(47, out, true);
+    Check.equal(0, r.exit(), "type 47 opened: " + r.stderr());
     Check.equal(TIMESTAMP, r.get("timestamp"), "timestamp");
     Check.equal(String.valueOf((char) getNativeDegree(k.handle)), r.get("strength"),
         "the envelope's strength letter is the session's degree");
     return r.get("content");
+  }
+
+  /** The class of a refusal: the Java opener's exception, the C++ opener's message read alike. */
+  static String refusal(String cppMessage) {
+    final String[][] classes = {{"base64", "BadEncoding"}, {"truncated|after its content", "Truncated"},
+      {"header|8-digit|8 digits|too small", "WrongHeader"}, {"RSA|bits", "WrongKey"}, {"wrapped|payload", "WrongType"}};
+    for (String[] c : classes) {
+      if (java.util.regex.Pattern.compile(c[0]).matcher(cppMessage).find()) return c[1];
+    }
+    return cppMessage;
+  }
+
+  static String javaRefusal(int type, String output) {
+    try {
+      JvmSuite.opener.open(type, output);
+      return "opened";
+    } catch (OpenException e) {
+      return e.getClass().getSimpleName();
+    }
   }
 
   static void run() throws Exception {
@@ -45,8 +69,8 @@ final class OutputTests {
       k.type("ab1!cd");
       String out = getNativeContent(k.handle, TIMESTAMP);
       Check.isTrue(out != null, "getNativeContent");
-      ServerTool.Result r = JvmSuite.server.open(48, out, null);
-      Check.equal(0, r.exitCode, "opened " + r);
+      Openers.Result r = Openers.open(48, out, false);
+      Check.equal(0, r.exit(), "opened " + r);
       Check.equal("S", r.get("strength"), "strength letter");
       Check.equal("ab1!cd", r.get("content"), "content");
       Check.equal("No Error!", getNativeLastError(k.handle), "after a success");
@@ -95,23 +119,78 @@ final class OutputTests {
       destroyNativeSession(k.handle);
     });
 
-    Check.test("salted hash replaces the text in both outputs", () -> {
+    Check.test("salted values of both outputs, each hash-random form, checked against the password", () -> {
       JvmSuite.destroyAll();
       KeyboardDriver k = keyboard(gl, "hash");
       k.type("secret9");
       setNativeHashRandom(k.handle, "3:pepper");  // refused: no suffix yet
       setNativeHashRandom(k.handle, "1pepper");   // refused
       Check.equal("secret9", serverContent(k.handle), "refused hash randoms leave the text");
-      setNativeHashRandom(k.handle, "1:pepper");
-      Check.equal(Oracles.saltedHash("secret9", "pepper", 'S'), serverContent(k.handle), "mode S: 16 digits");
-      setNativeHashRandom(k.handle, "2:salt:with:colons");
-      Check.equal(Oracles.saltedHash("secret9", "salt:with:colons", 'F'), serverContent(k.handle),
-          "mode F: 32 digits");
       Check.equal(1, setNativePublicKeyModulus(k.handle, JvmSuite.encModulusHex), "encryption key");
-      Check.equal(Oracles.saltedHash("secret9", "salt:with:colons", 'F'), pinContent(k), "PIN content, hashed");
+      final String[][] forms = {{"1:pepper", "pepper", "S"}, {"2:salt:with:colons", "salt:with:colons", "F"}};
+      for (String[] f : forms) {
+        setNativeHashRandom(k.handle, f[0]);
+        final char mode = f[2].charAt(0);
+        Check.equal(Oracles.saltedHash("secret9", f[1], mode), serverContent(k.handle), "type 48, " + f[0]);
+        Check.equal(Oracles.saltedHash("secret9", f[1], mode), pinContent(k), "type 47, " + f[0]);
+        for (int type : new int[] {47, 48}) {
+          String out = type == 47 ? getNativePinContent(k.handle, TIMESTAMP) : getNativeContent(k.handle, TIMESTAMP);
+          Opened o = JvmSuite.opener.open(type, out);
+          Check.isTrue(PasswordCheck.matches(o, "secret9", f[0]), "library: match, type " + type + " " + f[0]);
+          Check.isTrue(!PasswordCheck.matches(o, "secret8", f[0]), "library: mismatch, type " + type);
+          Check.isTrue(!PasswordCheck.matches(o, "secret9", (mode == 'S' ? "2:" : "1:") + f[1]), "library: other mode");
+          for (String pw : new String[] {"secret9", "secret8"}) {
+            Openers.Result r = Openers.open(type, out, type == 47, "--password", pw, "--salt", f[1], "--mode", f[2]);
+            Check.equal(pw.equals("secret9") ? 0 : 3, r.exit(), "openers' password check, type " + type + " " + pw);
+          }
+        }
+      }
+      // A type-48 envelope offered as type 47 without the encryption key: its payload is no RSA value.
+      String out48 = getNativeContent(k.handle, TIMESTAMP);
+      Check.equal("WrongType", javaRefusal(47, out48), "library refuses 48 as 47");
+      if (Openers.cpp(java.util.List.of("--type", "47", "--key", Openers.appKeyPem, "-"), out48).exit() == 0) {
+        System.out.println("    note: this tessel_open still takes a type-48 envelope as type 47 without --enc-key");
+      }
       clearNativePlaintext(k.handle);
       Check.equal(null, getNativeContent(k.handle, TIMESTAMP), "an empty password cannot be hashed");
       Check.equal("The format of the text is wrong!", getNativeLastError(k.handle), "its error");
+      destroyNativeSession(k.handle);
+    });
+
+    Check.test("corrupt and foreign envelopes: both openers refuse, with the same class of error", () -> {
+      JvmSuite.destroyAll();
+      KeyboardDriver k = keyboard(gl, "corrupt");
+      k.type("ab1!cd");
+      final String out = getNativeContent(k.handle, TIMESTAMP);
+      final byte[] raw = Base64.getDecoder().decode(out);
+      final Base64.Encoder b64 = Base64.getEncoder();
+      final byte[] header = raw.clone();
+      header[9] ^= 0x04;
+      final byte[] digit = raw.clone();
+      digit[3] = 'x';
+      final byte[] rsa = raw.clone();
+      rsa[40] ^= 0x01;
+      final String[][] table = {  // corrupted output, class of refusal
+        {out.substring(0, 30) + "*" + out.substring(31), "BadEncoding"},
+        {out.substring(0, out.length() - 8), "Truncated"},
+        {b64.encodeToString(java.util.Arrays.copyOf(raw, raw.length + 3)), "Truncated"},
+        {b64.encodeToString(header), "WrongHeader"},
+        {b64.encodeToString(digit), "WrongHeader"},
+        {b64.encodeToString(rsa), "WrongKey"},
+      };
+      for (String[] row : table) {
+        Openers.Result r = Openers.open(48, row[0], false);
+        Check.equal(1, r.exit(), "both refuse as bad output: " + row[1]);
+        Check.equal(row[1], refusal(r.stderr()), "C++ class of the refusal");
+        Check.equal(row[1], javaRefusal(48, row[0]), "Java class of the refusal");
+      }
+      // Sealed for another key of the same size: the encryption key's private half.
+      Openers.Result r = Openers.cpp(java.util.List.of("--key", Openers.encKeyPem, "-"), out);
+      Check.equal("WrongKey", refusal(r.stderr()), "C++ with a foreign key");
+      Check.equal(1, r.exit(), "C++ exit with a foreign key");
+      Openers.Result j = Openers.java(java.util.List.of("--key", Openers.encKeyPem, "-"), out);
+      Check.equal(1, j.exit(), "Java exit with a foreign key");
+      Check.isTrue(!j.stderr().contains("ab1!cd") && !r.stderr().contains("ab1!cd"), "no plaintext in messages");
       destroyNativeSession(k.handle);
     });
 
@@ -125,8 +204,9 @@ final class OutputTests {
       Check.equal(null, getNativeEncryptedPinCode(k.handle), "no text typed");
       Check.equal("Encryption error", getNativeLastError(k.handle), "its error");
       k.type("0815 pin");
-      Check.equal(Oracles.encryptedPinCode(challenge, "0815 pin"), getNativeEncryptedPinCode(k.handle),
-          "code");
+      byte[] code = getNativeEncryptedPinCode(k.handle);
+      Check.equal(Oracles.encryptedPinCode(challenge, "0815 pin"), code, "code");
+      Check.equal("0815 pin", EncryptedPinCode.open(challenge, new String(code, "US-ASCII")), "opened by the library");
       Check.equal("No Error!", getNativeLastError(k.handle), "after a success");
       setNativeChallengeCode(k.handle, new byte[0]);              // ignored
       setNativeChallengeCode(k.handle, new byte[] {0, 'x', 'y'});  // ignored: starts with zero
@@ -140,7 +220,7 @@ final class OutputTests {
       setNativeChallengeCode(k.handle, high);
       Check.equal(Oracles.encryptedPinCode(high, "0815 pin"), getNativeEncryptedPinCode(k.handle),
           "bytes above 0x7F are taken as they are");
-      byte[] code = getNativeEncryptedPinCode(k.handle);
+      code = getNativeEncryptedPinCode(k.handle);
       Check.isTrue(code != null && code[code.length - 1] != 0, "no terminator in the array");
       destroyNativeSession(k.handle);
     });
