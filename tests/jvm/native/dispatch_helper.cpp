@@ -1,4 +1,4 @@
-// Test-only JNI helper (libtessel_dispatch_test.so): the encryption dispatcher of the core that
+// Test-only JNI helper (in libtessel_jvm_helpers.so): the encryption dispatcher of the core that
 // libTesselVIP.so is built from, so the JVM suite can make every type 0..90 (the 51 native
 // methods only ever pass 47 and 48), and the deployment's type-68 master keys. Its own copy of
 // the core is not exported (--exclude-libs), so nothing in the keyboard library binds to it.

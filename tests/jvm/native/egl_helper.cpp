@@ -1,4 +1,4 @@
-// Test-only JNI helper (libtessel_egl_test.so): an offscreen OpenGL ES 1.1 context for the JVM
+// Test-only JNI helper (in libtessel_jvm_helpers.so): an offscreen OpenGL ES 1.1 context for the JVM
 // suite, so the keyboard's surface callbacks run from Java exactly as an app's GL renderer
 // thread runs them, and the frame can be read back into Java.
 //

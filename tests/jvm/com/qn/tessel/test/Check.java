@@ -4,9 +4,9 @@ import java.util.Arrays;
 import java.util.Objects;
 
 /**
- * The suite's assertions: each failed check is counted and printed with the name of the case it
- * belongs to, and the case goes on, so one run reports every broken expectation. A case that
- * throws is reported as failed at that point.
+ * The suite's assertions: each failed check is counted and printed with the name of its case,
+ * and the case goes on, so one run reports every broken expectation. A case that throws is
+ * reported as failed at that point.
  */
 final class Check {
   private static int checks;
@@ -29,8 +29,8 @@ final class Check {
       fail("threw " + t);
       t.printStackTrace(System.out);
     }
-    final long ms = (System.nanoTime() - start) / 1_000_000;
-    System.out.printf("[%s] %s (%d ms)%n", failures == before ? "  OK  " : "FAILED", name, ms);
+    System.out.printf("[%s] %s (%d ms)%n", failures == before ? "  OK  " : "FAILED", name,
+        (System.nanoTime() - start) / 1_000_000);
   }
 
   static void fail(String message) {
@@ -43,15 +43,13 @@ final class Check {
     if (!condition) fail(what);
   }
 
-  static void equal(long expected, long actual, String what) {
-    ++checks;
-    if (expected != actual) fail(what + ": expected " + expected + ", got " + actual);
-  }
-
-  /** Objects, or byte arrays by content. */
+  /** Numbers of any width, other objects, or byte arrays by content. */
   static void equal(Object expected, Object actual, String what) {
     ++checks;
-    if (expected instanceof byte[] && actual instanceof byte[]) {
+    if (expected instanceof Number && actual instanceof Number && !(expected instanceof Double)) {
+      expected = ((Number) expected).longValue();
+      actual = ((Number) actual).longValue();
+    } else if (expected instanceof byte[] && actual instanceof byte[]) {
       expected = Arrays.toString((byte[]) expected);
       actual = Arrays.toString((byte[]) actual);
     }

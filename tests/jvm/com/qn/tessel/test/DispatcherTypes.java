@@ -33,7 +33,6 @@ final class DispatcherTypes {
   }
 
   static void run() throws Exception {
-    System.load(JvmSuite.property("tessel.dispatchHelper"));
     Check.test("every type the dispatcher makes is opened alike by both openers", () -> {
       final String text = "Tessel 7!";
       final String pin = "739182";

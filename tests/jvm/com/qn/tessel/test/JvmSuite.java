@@ -20,10 +20,8 @@ import java.util.Locale;
  * The JVM suite: loads the built libTesselVIP.so into a real JVM and drives keyboards only
  * through com.qn.tessel.plugin.QNKbdJniLib, as an app does. Run by CTest (tests/jvm.cmake) with
  * the paths it needs as system properties:
- *   tessel.library     libTesselVIP.so                tessel.eglHelper  libtessel_egl_test.so
- *   tessel.server      the C++ opener tessel_open     tessel.appKey     builtin_default_key.pem
- *   tessel.tmp         a scratch directory
- *   tessel.dispatchHelper  libtessel_dispatch_test.so
+ *   tessel.library  libTesselVIP.so     tessel.helpers  the test-only JNI helpers (tests/jvm/native)
+ *   tessel.server   tessel_open (C++)   tessel.appKey  builtin_default_key.pem   tessel.tmp  scratch
  * Exit status 0 when every check passed.
  */
 public final class JvmSuite {
@@ -34,7 +32,6 @@ public final class JvmSuite {
 
   static String appModulusHex;
   static String encModulusHex;
-  static RSAPublicKey encPublicKey;
   static TesselOpener opener;
 
   private JvmSuite() {}
@@ -84,7 +81,7 @@ public final class JvmSuite {
   }
 
   private static void setUp() throws Exception {
-    System.load(property("tessel.eglHelper"));
+    System.load(property("tessel.helpers"));
     // The library is loaded here, before the class is initialised: its own System.loadLibrary
     // then fails (the build directory is not on java.library.path) and must not matter.
     System.load(property("tessel.library"));
@@ -95,8 +92,7 @@ public final class JvmSuite {
     KeyPairGenerator generator = KeyPairGenerator.getInstance("RSA");
     generator.initialize(1024);
     KeyPair enc = generator.generateKeyPair();
-    encPublicKey = (RSAPublicKey) enc.getPublic();
-    encModulusHex = Oracles.modulusHex(encPublicKey);
+    encModulusHex = ((RSAPublicKey) enc.getPublic()).getModulus().toString(16).toUpperCase(Locale.ROOT);
     File pem = new File(property("tessel.tmp"), "enc_platform_key.pem");
     Files.write(pem.toPath(), Oracles.pkcs8Pem(enc.getPrivate()).getBytes(StandardCharsets.US_ASCII));
     Openers.encKeyPem = pem.getPath();
