@@ -59,10 +59,9 @@ add_test(NAME jvm_suite
 set_tests_properties(jvm_suite PROPERTIES TIMEOUT 300
   FAIL_REGULAR_EXPRESSION "WARNING in native method|FATAL ERROR in native method")
 
-# Under AddressSanitizer (GCC) the JVM gets the sanitizer runtime preloaded, so the suite checks
-# the JNI layer for memory errors too. The JVM handles SIGSEGV itself and keeps its heap until
-# exit, hence handle_segv=0 and no leak report (the C++ suites cover leaks). Other sanitizer
-# builds cannot load the library into an uninstrumented JVM: the suite is labelled nosan there.
+# Under AddressSanitizer (GCC) the JVM gets the runtime preloaded, so the suite checks the JNI
+# layer too; the JVM handles SIGSEGV itself and keeps its heap to exit (handle_segv=0, no leak
+# report). Other sanitizers cannot run in an uninstrumented JVM: the suite is labelled nosan.
 if(TESSEL_SANITIZE)
   set(TESSEL_JVM_PRELOAD "")
   if(TESSEL_SANITIZE MATCHES "address" AND NOT TESSEL_SANITIZE MATCHES "thread|memory" AND CMAKE_CXX_COMPILER_ID STREQUAL "GNU")

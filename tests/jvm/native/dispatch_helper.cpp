@@ -1,7 +1,6 @@
 // Test-only JNI helper (in libtessel_jvm_helpers.so): the encryption dispatcher of the core that
 // libTesselVIP.so is built from, so the JVM suite can make every type 0..90 (the 51 native
-// methods only ever pass 47 and 48), and the deployment's type-68 master keys. Its own copy of
-// the core is not exported (--exclude-libs), so nothing in the keyboard library binds to it.
+// methods only ever pass 47 and 48), and the deployment's type-68 master keys.
 #include <jni.h>
 
 #include "crypto/dispatch_payloads.h"
@@ -21,8 +20,8 @@ struct Utf {
 
 }  // namespace
 
-// The output of `type`, or null when the dispatcher refuses (its code is not needed here).
-extern "C" JNIEXPORT jstring JNICALL Java_com_qn_tessel_test_DispatcherTypes_dispatch(
+// The output of `type`, or null when the dispatcher refuses.
+extern "C" JNIEXPORT jstring JNICALL Java_com_qn_tessel_test_OutputTests_dispatch(
     JNIEnv* env, jclass, jint type, jstring app, jstring enc, jstring text, jstring timestamp) {
   const Utf a(env, app), e(env, enc), t(env, text), ts(env, timestamp);
   const char* const keys[2] = {a.chars, e.chars};
@@ -31,8 +30,7 @@ extern "C" JNIEXPORT jstring JNICALL Java_com_qn_tessel_test_DispatcherTypes_dis
   return env->NewStringUTF(out.c_str());
 }
 
-extern "C" JNIEXPORT jbyteArray JNICALL Java_com_qn_tessel_test_DispatcherTypes_masterPinKey(JNIEnv* env, jclass,
-                                                                                          jchar selector) {
+extern "C" JNIEXPORT jbyteArray JNICALL Java_com_qn_tessel_test_OutputTests_masterPinKey(JNIEnv* env, jclass, jchar selector) {
   tessel::SecureBuffer key;
   if (tessel::masterPinKey(static_cast<char>(selector), &key) != 0) return nullptr;
   jbyteArray out = env->NewByteArray(16);

@@ -9,7 +9,6 @@ import java.util.Objects;
  * reported as failed at that point.
  */
 final class Check {
-  private static int checks;
   private static int failures;
   private static String current = "";
 
@@ -22,15 +21,13 @@ final class Check {
   static void test(String name, Body body) {
     current = name;
     final int before = failures;
-    final long start = System.nanoTime();
     try {
       body.run();
     } catch (Throwable t) {
       fail("threw " + t);
       t.printStackTrace(System.out);
     }
-    System.out.printf("[%s] %s (%d ms)%n", failures == before ? "  OK  " : "FAILED", name,
-        (System.nanoTime() - start) / 1_000_000);
+    System.out.printf("[%s] %s%n", failures == before ? "  OK  " : "FAILED", name);
   }
 
   static void fail(String message) {
@@ -39,13 +36,11 @@ final class Check {
   }
 
   static void isTrue(boolean condition, String what) {
-    ++checks;
     if (!condition) fail(what);
   }
 
   /** Numbers of any width, other objects, or byte arrays by content. */
   static void equal(Object expected, Object actual, String what) {
-    ++checks;
     if (expected instanceof Number && actual instanceof Number && !(expected instanceof Double)) {
       expected = ((Number) expected).longValue();
       actual = ((Number) actual).longValue();
@@ -58,9 +53,5 @@ final class Check {
 
   static int failures() {
     return failures;
-  }
-
-  static int checks() {
-    return checks;
   }
 }

@@ -37,19 +37,14 @@ final class EglContext implements AutoCloseable {
       t.setDaemon(true);
       return t;
     });
-    long[] made = new long[1];
-    String[] text = new String[1];
-    call(() -> {
-      made[0] = nativeCreate(width, height);
-      text[0] = made[0] == 0 ? nativeLastError() : nativeRenderer();
-      return null;
-    });
-    if (made[0] == 0) {
+    final long made = call(() -> nativeCreate(width, height));
+    final String text = call(() -> made == 0 ? nativeLastError() : nativeRenderer());
+    if (made == 0) {
       thread.shutdownNow();
-      throw new IllegalStateException("no offscreen GLES 1.1 context: " + text[0]);
+      throw new IllegalStateException("no offscreen GLES 1.1 context: " + text);
     }
-    this.handle = made[0];
-    this.renderer = text[0];
+    this.handle = made;
+    this.renderer = text;
   }
 
   String renderer() {

@@ -109,9 +109,8 @@ public final class JvmSuite {
     KeyboardTests.run();
     OutputTests.run();
     RenderTests.run();
-    DispatcherTypes.run();
     destroyAll();
-    System.out.printf("%d checks, %d failed%n", Check.checks(), Check.failures());
+    System.out.printf("%d checks failed%n", Check.failures());
     System.exit(Check.failures() == 0 ? 0 : 1);
   }
 }

@@ -10,12 +10,11 @@ import java.util.Arrays;
 import java.util.List;
 import java.util.Map;
 import java.util.TreeMap;
-import java.util.concurrent.TimeUnit;
 
 /**
  * The bank's two openers side by side: tessel_open (C++ on OpenSSL, run as a process) and the
  * command line of tessel-server.jar (JDK providers, run in this JVM). Both get the same options
- * and the output on stdin; their exit codes and "field: value" lines must agree.
+ * and the output on stdin (never on a command line); exit codes and "field: value" lines must agree.
  */
 final class Openers {
   static String cppTool;
@@ -30,13 +29,13 @@ final class Openers {
     }
   }
 
-  private static Result parse(int exit, String stdout, String stderr) {
+  private static Result parse(int exit, byte[] stdout, byte[] stderr) {
     Map<String, String> fields = new TreeMap<>();
-    for (String line : stdout.split("\n")) {
+    for (String line : new String(stdout, StandardCharsets.UTF_8).split("\n")) {
       int colon = line.indexOf(": ");
       if (colon > 0) fields.put(line.substring(0, colon), line.substring(colon + 2));
     }
-    return new Result(exit, fields, stderr.trim());
+    return new Result(exit, fields, new String(stderr, StandardCharsets.UTF_8).trim());
   }
 
   static Result cpp(List<String> args, String output) throws Exception {
@@ -45,10 +44,8 @@ final class Openers {
     Process p = new ProcessBuilder(cmd).start();
     p.getOutputStream().write(output.getBytes(StandardCharsets.ISO_8859_1));
     p.getOutputStream().close();
-    String stdout = new String(p.getInputStream().readAllBytes(), StandardCharsets.UTF_8);
-    String stderr = new String(p.getErrorStream().readAllBytes(), StandardCharsets.UTF_8);
-    if (!p.waitFor(60, TimeUnit.SECONDS)) throw new IllegalStateException("tessel_open did not finish");
-    return parse(p.exitValue(), stdout, stderr);
+    byte[] stdout = p.getInputStream().readAllBytes();
+    return parse(p.waitFor(), stdout, p.getErrorStream().readAllBytes());
   }
 
   static Result java(List<String> args, String output) {
@@ -56,10 +53,10 @@ final class Openers {
     ByteArrayOutputStream err = new ByteArrayOutputStream();
     int exit = Cli.run(args.toArray(new String[0]), new ByteArrayInputStream(output.getBytes(StandardCharsets.ISO_8859_1)),
         new PrintStream(out, true, StandardCharsets.UTF_8), new PrintStream(err, true, StandardCharsets.UTF_8));
-    return parse(exit, out.toString(StandardCharsets.UTF_8), err.toString(StandardCharsets.UTF_8));
+    return parse(exit, out.toByteArray(), err.toByteArray());
   }
 
-  /** Both openers on the output of `type` (stdin, never a command line); returns the agreed result. */
+  /** Both openers on the output of `type`; returns the C++ result once the two agree. */
   static Result open(int type, String output, boolean withEncKey, String... options) throws Exception {
     List<String> args = new ArrayList<>(List.of("--type", Integer.toString(type), "--key", appKeyPem));
     if (withEncKey) args.addAll(List.of("--enc-key", encKeyPem));
