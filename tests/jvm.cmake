@@ -63,7 +63,6 @@ set_tests_properties(jvm_suite PROPERTIES TIMEOUT 300
 # layer too; the JVM handles SIGSEGV itself and keeps its heap to exit (handle_segv=0, no leak
 # report). Other sanitizers cannot run in an uninstrumented JVM: the suite is labelled nosan.
 if(TESSEL_SANITIZE)
-  set(TESSEL_JVM_PRELOAD "")
   if(TESSEL_SANITIZE MATCHES "address" AND NOT TESSEL_SANITIZE MATCHES "thread|memory" AND CMAKE_CXX_COMPILER_ID STREQUAL "GNU")
     execute_process(COMMAND ${CMAKE_CXX_COMPILER} -print-file-name=libasan.so
                     OUTPUT_VARIABLE TESSEL_JVM_PRELOAD OUTPUT_STRIP_TRAILING_WHITESPACE)

@@ -1,6 +1,6 @@
 // Test-only JNI helper (in libtessel_jvm_helpers.so): the encryption dispatcher of the core that
 // libTesselVIP.so is built from, so the JVM suite can make every type 0..90 (the 51 native
-// methods only ever pass 47 and 48), and the deployment's type-68 master keys.
+// methods only ever pass 47 and 48; null when it refuses), and the deployment's type-68 master keys.
 #include <jni.h>
 
 #include "crypto/dispatch_payloads.h"
@@ -20,7 +20,6 @@ struct Utf {
 
 }  // namespace
 
-// The output of `type`, or null when the dispatcher refuses.
 extern "C" JNIEXPORT jstring JNICALL Java_com_qn_tessel_test_OutputTests_dispatch(
     JNIEnv* env, jclass, jint type, jstring app, jstring enc, jstring text, jstring timestamp) {
   const Utf a(env, app), e(env, enc), t(env, text), ts(env, timestamp);

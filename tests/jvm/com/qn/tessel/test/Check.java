@@ -9,7 +9,7 @@ import java.util.Objects;
  * reported as failed at that point.
  */
 final class Check {
-  private static int failures;
+  static int failures;
   private static String current = "";
 
   private Check() {}
@@ -49,9 +49,5 @@ final class Check {
       actual = Arrays.toString((byte[]) actual);
     }
     if (!Objects.equals(expected, actual)) fail(what + ": expected <" + expected + ">, got <" + actual + ">");
-  }
-
-  static int failures() {
-    return failures;
   }
 }

@@ -63,10 +63,7 @@ final class EglContext implements AutoCloseable {
   }
 
   void run(Runnable work) throws Exception {
-    call(() -> {
-      work.run();
-      return null;
-    });
+    call(Executors.callable(work));
   }
 
   /** The pbuffer as RGBA bytes, top row first (the orientation of the app's touch coordinates). */

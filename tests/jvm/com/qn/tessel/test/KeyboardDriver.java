@@ -42,11 +42,6 @@ final class KeyboardDriver {
     return new double[] {(position - 19 + 2) * kw, 2.5 * kh};
   }
 
-  int tapPosition(int position) {
-    double[] c = positionCentre(position);
-    return tap(c[0], c[1]);
-  }
-
   int deleteKey() {
     return tap(9.25 * kw, 2.5 * kh);
   }
@@ -87,7 +82,8 @@ final class KeyboardDriver {
       Check.equal(0, tap(0.75 * kw, 2.5 * kh), "shift key");
       shift = !shift;
     }
-    Check.equal(0, tapPosition(position), "key '" + c + "'");
+    double[] centre = positionCentre(position);
+    Check.equal(0, tap(centre[0], centre[1]), "key '" + c + "'");
   }
 
   void type(String text) {

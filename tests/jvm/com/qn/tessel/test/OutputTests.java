@@ -18,11 +18,13 @@ import javax.crypto.Cipher;
 import javax.crypto.spec.SecretKeySpec;
 
 /**
- * What an app gets out of a session, checked against independent parties: the envelopes of
- * getNativeContent / getNativePinContent and of every other type the dispatcher makes (made
- * through tests/jvm/native/dispatch_helper.cpp on the core libTesselVIP.so is built from) opened
- * by both server-side openers, which must agree with each other and with what went in; the
- * encrypted PIN code against RC4 over the JVM's SHA-1, salted values against the JVM's MD5, the
+ * Typing through setNativeTouchPos (surface callbacks on their own GL thread, touches on the
+ * test's main thread as on an app's UI thread; the rules are the C++ suites' business) and what
+ * an app then gets out of the session, checked against independent parties: the envelopes of
+ * getNativeContent / getNativePinContent and of every other type the dispatcher makes (through
+ * tests/jvm/native/dispatch_helper.cpp, on the core libTesselVIP.so is built from) opened by both
+ * server-side openers, which must agree with each other and with what went in; the encrypted PIN
+ * code against RC4 over the JVM's SHA-1, the measure value and salted values against its MD5,
  * degree letters and verify codes against documented examples, and the last-error texts.
  */
 final class OutputTests {
@@ -32,7 +34,7 @@ final class OutputTests {
   static String pinContent(KeyboardDriver k) throws Exception {
     String out = getNativePinContent(k.handle, TIMESTAMP);
     if (out == null) return null;
-    Openers.Result r = Openers.open(47, out, true);
+    Bank.Result r = Bank.open(47, out, true);
     Check.equal(0, r.exit(), "type 47 opened: " + r.stderr());
     Check.equal(TIMESTAMP, r.get("timestamp"), "timestamp");
     Check.equal(String.valueOf((char) getNativeDegree(k.handle)), r.get("strength"),
@@ -78,11 +80,18 @@ final class OutputTests {
     byte[] key24 = HexFormat.of().parseHex(HexFormat.of().formatHex(key16) + HexFormat.of().formatHex(key16, 0, 8));
     Cipher c = Cipher.getInstance("DESede/ECB/NoPadding");
     c.init(Cipher.ENCRYPT_MODE, new SecretKeySpec(key24, "DESede"));
-    return Oracles.hex(c.doFinal(data), true);
+    return Bank.hex(c.doFinal(data), true);
+  }
+
+  static void expectTyped(KeyboardDriver k, String text) throws Exception {
+    Check.equal(text.length(), getNativeContentLen(k.handle), "length of '" + text + "'");
+    Check.equal(text, serverContent(k.handle), "content opened by the server");
+    Check.equal(text.isEmpty() ? null : Bank.md5Hex(text), getNativeMeasureValue(k.handle), "measure value");
   }
 
   static void run() throws Exception {
     try (EglContext gl = new EglContext(WIDTH, HEIGHT)) {
+      System.out.println("    GL renderer: " + gl.renderer());
       cases(gl);
     }
     Check.test("every type the dispatcher makes is opened alike by both openers", () -> {
@@ -98,10 +107,10 @@ final class OutputTests {
         String out = dispatch(type, JvmSuite.appModulusHex, JvmSuite.encModulusHex, input, TIMESTAMP);
         Check.equal(NO_OUTPUT.contains(type), out == null, "type " + type + " makes an output");
         if (out == null) continue;
-        Openers.Result r = Openers.open(type, out, true, "--pin-key", pinKey);
+        Bank.Result r = Bank.open(type, out, true, "--pin-key", pinKey);
         String expected = type == 38 || type == 68 ? pin
-            : type == 5 ? Oracles.hex(Oracles.digest("SHA-1", Oracles.ascii(text)), true)
-            : HASHED.contains(type) ? Oracles.saltedHash(text, "pepper", 'S') : text;
+            : type == 5 ? Bank.hex(Bank.digest("SHA-1", Bank.ascii(text)), true)
+            : HASHED.contains(type) ? Bank.saltedHash(text, "pepper", 'S') : text;
         Check.equal(expected, r.get("content"), "content of type " + type + " " + r.stderr());
         Check.isTrue(r.get("timestamp") == null || r.get("timestamp").equals(TIMESTAMP), "timestamp of type " + type);
         if (r.exit() == 0 && expected.equals(r.get("content"))) ++opened;
@@ -112,24 +121,56 @@ final class OutputTests {
   }
 
   private static void cases(EglContext gl) throws Exception {
-    Check.test("content envelope: strength letter, timestamp, text; last error", () -> {
+    Check.test("a password typed through key centres, with shift, symbols and space; its envelope", () -> {
       JvmSuite.destroyAll();
-      KeyboardDriver k = keyboard(gl, "content");
+      KeyboardDriver k = keyboard(gl, "password");
       Check.equal("No Error!", getNativeLastError(k.handle), "before any output");
-      k.type("ab1!cd");
-      String out = getNativeContent(k.handle, TIMESTAMP);
-      Openers.Result r = Openers.open(48, out, false);
-      Check.equal(0, r.exit(), "opened " + r);
-      Check.equal("S", r.get("strength"), "strength letter");
-      Check.equal("ab1!cd", r.get("content"), "content");
+      final String text = "Tessel 7!x{q}";
+      k.type(text);
+      expectTyped(k, text);
       Check.equal("No Error!", getNativeLastError(k.handle), "after a success");
+      String out = getNativeContent(k.handle, TIMESTAMP);
+      Check.equal("S", Bank.open(48, out, false).get("strength"), "strength letter");
       Check.isTrue(!out.equals(getNativeContent(k.handle, TIMESTAMP)), "a fresh session key every call");
       Check.equal(null, getNativeContent(k.handle, null), "no timestamp");
       Check.equal("The timestamp is missing!", getNativeLastError(k.handle), "its error");
       Check.equal(null, getNativePinContent(k.handle, TIMESTAMP), "PIN content without an encryption key");
       Check.equal("The encryption platform modulus is missing!", getNativeLastError(k.handle), "its error");
-      Check.equal(6, getNativeContentLen(k.handle), "outputs leave the text in place");
-      Check.equal("ab1!cd", serverContent(k.handle), "and readable again");
+      Check.equal(k.handle, createNativeSession("password"), "create with the same name finds the session");
+      setNativeMaxLength(k.handle, (short) text.length());
+      setNativeMaxLength(k.handle, (short) -1);  // ignored
+      k.type("z");
+      Check.equal(text.length(), getNativeContentLen(k.handle), "the maximum length stops a key");
+      Check.equal(0, k.deleteKey(), "delete");
+      expectTyped(k, text.substring(0, text.length() - 1));
+      Check.equal(TOUCH_DONE, k.doneKey(), "done");
+      Check.equal(0, clearNativePlaintext(k.handle), "clear");
+      expectTyped(k, "");
+      destroyNativeSession(k.handle);
+    });
+
+    Check.test("number pads (type 1 with '.', type 2 digits only) and switch mode 1", () -> {
+      JvmSuite.destroyAll();
+      KeyboardDriver k = keyboard(gl, "pad");
+      setNativeKbdType(k.handle, KBD_PAD_WITH_POINT);
+      k.typePad("90.5");
+      Check.equal(0, k.tapPad(0, 3), "pad delete");
+      expectTyped(k, "90.");
+      Check.equal(TOUCH_DONE, k.tapPad(3, 2), "row 3 column 2 is done on type 1");
+      Check.equal(0, k.tapPad(1, 3), "clear");
+      setNativeKbdType(k.handle, KBD_PAD_DIGITS);
+      k.typePad("36");
+      Check.equal(0, k.tapPad(3, 1), "'.' is inert on type 2");
+      Check.equal(TOUCH_DONE, k.tapPad(3, 3), "done covers rows 2 and 3 of column 3");
+      setNativeKbdType(k.handle, KBD_FULL);
+      setNativeSwitchMode(k.handle, (short) 1);
+      k.type("a");
+      Check.equal(0, k.tap(1.25 * k.kw, 3.5 * k.kh), "switch key opens the digits pad");
+      k.typePad("12");
+      Check.equal(0, k.tapPad(1, 3), "back to the full keyboard (not clear)");
+      setNativeSwitchMode(k.handle, (short) 5);  // stored as 0: the switch key toggles symbols
+      k.type("b+");
+      expectTyped(k, "36a12b+");
       destroyNativeSession(k.handle);
     });
 
@@ -145,8 +186,8 @@ final class OutputTests {
       for (String[] f : forms) {
         setNativeHashRandom(k.handle, f[0]);
         final char mode = f[2].charAt(0);
-        Check.equal(Oracles.saltedHash("secret9", f[1], mode), serverContent(k.handle), "type 48, " + f[0]);
-        Check.equal(Oracles.saltedHash("secret9", f[1], mode), pinContent(k), "type 47, " + f[0]);
+        Check.equal(Bank.saltedHash("secret9", f[1], mode), serverContent(k.handle), "type 48, " + f[0]);
+        Check.equal(Bank.saltedHash("secret9", f[1], mode), pinContent(k), "type 47, " + f[0]);
         for (int type : new int[] {47, 48}) {
           String out = type == 47 ? getNativePinContent(k.handle, TIMESTAMP) : getNativeContent(k.handle, TIMESTAMP);
           Opened o = JvmSuite.opener.open(type, out);
@@ -154,7 +195,7 @@ final class OutputTests {
           Check.isTrue(!PasswordCheck.matches(o, "secret8", f[0]), "library: mismatch, type " + type);
           Check.isTrue(!PasswordCheck.matches(o, "secret9", (mode == 'S' ? "2:" : "1:") + f[1]), "library: other mode");
           for (String pw : new String[] {"secret9", "secret8"}) {
-            Openers.Result r = Openers.open(type, out, type == 47, "--password", pw, "--salt", f[1], "--mode", f[2]);
+            Bank.Result r = Bank.open(type, out, type == 47, "--password", pw, "--salt", f[1], "--mode", f[2]);
             Check.equal(pw.equals("secret9") ? 0 : 3, r.exit(), "openers' password check, type " + type + " " + pw);
           }
         }
@@ -162,7 +203,7 @@ final class OutputTests {
       // A type-48 envelope offered as type 47 without the encryption key: its payload is no RSA value.
       String out48 = getNativeContent(k.handle, TIMESTAMP);
       Check.equal("WrongType", javaRefusal(47, out48), "library refuses 48 as 47");
-      if (Openers.cpp(java.util.List.of("--type", "47", "--key", Openers.appKeyPem, "-"), out48).exit() == 0) {
+      if (Bank.cpp(java.util.List.of("--type", "47", "--key", Bank.appKeyPem, "-"), out48).exit() == 0) {
         System.out.println("    note: this tessel_open still takes a type-48 envelope as type 47 without --enc-key");
       }
       clearNativePlaintext(k.handle);
@@ -186,16 +227,16 @@ final class OutputTests {
         {patched(raw, 40, raw[40] ^ 0x01), "WrongKey"},
       };
       for (String[] row : table) {
-        Openers.Result r = Openers.open(48, row[0], false);
+        Bank.Result r = Bank.open(48, row[0], false);
         Check.equal(1, r.exit(), "both refuse as bad output: " + row[1]);
         Check.equal(row[1], refusal(r.stderr()), "C++ class of the refusal");
         Check.equal(row[1], javaRefusal(48, row[0]), "Java class of the refusal");
       }
       // Sealed for another key of the same size: the encryption key's private half.
-      Openers.Result r = Openers.cpp(java.util.List.of("--key", Openers.encKeyPem, "-"), out);
+      Bank.Result r = Bank.cpp(java.util.List.of("--key", Bank.encKeyPem, "-"), out);
       Check.equal("WrongKey", refusal(r.stderr()), "C++ with a foreign key");
       Check.equal(1, r.exit(), "C++ exit with a foreign key");
-      Openers.Result j = Openers.java(java.util.List.of("--key", Openers.encKeyPem, "-"), out);
+      Bank.Result j = Bank.java(java.util.List.of("--key", Bank.encKeyPem, "-"), out);
       Check.equal(1, j.exit(), "Java exit with a foreign key");
       Check.isTrue(!j.stderr().contains("ab1!cd") && !r.stderr().contains("ab1!cd"), "no plaintext in messages");
       destroyNativeSession(k.handle);
@@ -206,13 +247,13 @@ final class OutputTests {
       KeyboardDriver k = keyboard(gl, "pincode");
       Check.equal(null, getNativeEncryptedPinCode(k.handle), "no challenge code");
       Check.equal("Challenge code is empty", getNativeLastError(k.handle), "its error");
-      byte[] challenge = Oracles.ascii("challenge-4711");
+      byte[] challenge = Bank.ascii("challenge-4711");
       setNativeChallengeCode(k.handle, challenge);
       Check.equal(null, getNativeEncryptedPinCode(k.handle), "no text typed");
       Check.equal("Encryption error", getNativeLastError(k.handle), "its error");
       k.type("0815 pin");
       byte[] code = getNativeEncryptedPinCode(k.handle);
-      Check.equal(Oracles.encryptedPinCode(challenge, "0815 pin"), code, "code");
+      Check.equal(Bank.encryptedPinCode(challenge, "0815 pin"), code, "code");
       Check.equal("0815 pin", EncryptedPinCode.open(challenge, new String(code, "US-ASCII")), "opened by the library");
       Check.equal("No Error!", getNativeLastError(k.handle), "after a success");
       final byte[] high = {(byte) 0xC3, (byte) 0xA9, (byte) 0xFF, 0x7F};
@@ -220,7 +261,7 @@ final class OutputTests {
         {{}, challenge}, {{0, 'x'}, challenge}, {null, challenge}, {{'a', 'b', 0, 'c'}, {'a', 'b'}}, {high, high}};
       for (byte[][] c : challenges) {  // a zero byte ends one, bytes above 0x7F are taken as they are
         setNativeChallengeCode(k.handle, c[0]);
-        Check.equal(Oracles.encryptedPinCode(c[1], "0815 pin"), getNativeEncryptedPinCode(k.handle),
+        Check.equal(Bank.encryptedPinCode(c[1], "0815 pin"), getNativeEncryptedPinCode(k.handle),
             "challenge " + java.util.Arrays.toString(c[0]));
       }
       code = getNativeEncryptedPinCode(k.handle);
