@@ -27,7 +27,7 @@ final class EglContext implements AutoCloseable {
   final int height;
   private final ExecutorService thread;
   private final long handle;
-  private final String renderer;
+  final String renderer;
 
   EglContext(int width, int height) throws Exception {
     this.width = width;
@@ -45,10 +45,6 @@ final class EglContext implements AutoCloseable {
     }
     this.handle = made;
     this.renderer = text;
-  }
-
-  String renderer() {
-    return renderer;
   }
 
   <T> T call(Callable<T> work) throws Exception {

@@ -91,7 +91,7 @@ final class OutputTests {
 
   static void run() throws Exception {
     try (EglContext gl = new EglContext(WIDTH, HEIGHT)) {
-      System.out.println("    GL renderer: " + gl.renderer());
+      System.out.println("    GL renderer: " + gl.renderer);
       cases(gl);
     }
     Check.test("every type the dispatcher makes is opened alike by both openers", () -> {
@@ -116,6 +116,9 @@ final class OutputTests {
         if (r.exit() == 0 && expected.equals(r.get("content"))) ++opened;
       }
       Check.equal(91 - NO_OUTPUT.size(), opened, "types opened by both openers");
+      // A timestamp holding ':' is found by splitting a hex payload at its last ':'.
+      Opened o = JvmSuite.opener.open(10, dispatch(10, JvmSuite.appModulusHex, JvmSuite.encModulusHex, text, "12:00:00"));
+      Check.equal(text + "@12:00:00", o.content() + "@" + o.timestamp(), "timestamp with ':', library");
       System.out.println("    " + opened + " encryption types opened by both openers");
     });
   }
