@@ -97,17 +97,17 @@ final class OutputTests {
     Check.test("every type the dispatcher makes is opened alike by both openers", () -> {
       final String text = "Tessel 7!";
       final String pin = "739182";
-      final String pinKey = "C4D5E6F708192A3B4C5D6E7F80912233";
       final byte[] working = HexFormat.of().parseHex("3b1f6a0c9d2e4f5871a6c3e5d7092b4f");
-      final String type68 = "1" + SEP + wrap(masterPinKey('1'), working) + SEP
-          + wrap(working, HexFormat.of().parseHex(pinKey)) + SEP + pin;
+      final String[] keys68 = {"--master-key", Bank.hex(masterPinKey('1'), true), "--wrapped-working-key",
+        wrap(masterPinKey('1'), working), "--wrapped-pin-key", wrap(working, HexFormat.of().parseHex("C4D5E6F708192A3B4C5D6E7F80912233"))};
+      final String type68 = "1" + SEP + keys68[3] + SEP + keys68[5] + SEP + pin;
       int opened = 0;
       for (int type = 0; type <= 90; ++type) {
         String input = type == 38 ? pin : type == 68 ? type68 : HASHED.contains(type) ? text + SEP + "pepper" + SEP + "S" : text;
         String out = dispatch(type, JvmSuite.appModulusHex, JvmSuite.encModulusHex, input, TIMESTAMP);
         Check.equal(NO_OUTPUT.contains(type), out == null, "type " + type + " makes an output");
         if (out == null) continue;
-        Bank.Result r = Bank.open(type, out, true, "--pin-key", pinKey);
+        Bank.Result r = Bank.open(type, out, true, keys68);  // both derive the PIN key
         String expected = type == 38 || type == 68 ? pin
             : type == 5 ? Bank.hex(Bank.digest("SHA-1", Bank.ascii(text)), true)
             : HASHED.contains(type) ? Bank.saltedHash(text, "pepper", 'S') : text;
