@@ -1,6 +1,7 @@
 #!/usr/bin/env bash
 # Envelopes opened per second by the C++ opener (OpenSSL) and the Java opener (JDK providers) on
 # the same type-48 envelopes, sealed by the device dispatcher for a 1024-bit and a 2048-bit key.
+# Rates per second of CPU time on both sides (the JVM warmed up first); the ratio is informative.
 # Usage: bench/opener_bench.sh [BUILD_DIR]   (configured with -DTESSEL_BUILD_BENCH=ON)
 set -euo pipefail
 build=${1:-build}
