@@ -1,12 +1,11 @@
-// Test-only JNI helper (libtessel_egl_test.so): an offscreen OpenGL ES 1.1 context for the JVM
-// suite, so the keyboard's surface callbacks run from Java exactly as an app's GL renderer
+// Test-only JNI helper (in libtessel_jvm_helpers.so): an offscreen OpenGL ES 1.1 context for the
+// JVM suite, so the keyboard's surface callbacks run from Java exactly as an app's GL renderer
 // thread runs them, and the frame can be read back into Java.
 //
 // com.qn.tessel.test.EglContext calls these on its GL thread: create() makes the same Mesa
 // surfaceless context and pbuffer the C++ suites use (tests/support/egl_context.h) current on
-// the calling thread; readPixels() returns the RGBA bytes of the pbuffer, top row first;
-// release() destroys it. Failures are reported as a 0 handle / null array plus a message from
-// lastError(); nothing throws.
+// the calling thread, or returns 0 with the reason in lastError(); readPixels() returns the RGBA
+// bytes of the pbuffer, top row first (null on failure); release() destroys it.
 #include <jni.h>
 
 #include <cstdint>
@@ -16,36 +15,18 @@
 
 #include "../../support/egl_context.h"
 
-namespace {
-
 using tessel::test::GlesContext;
 
-thread_local std::string g_error;
+static thread_local std::string g_error;
 
-GlesContext* fromHandle(jlong handle) { return reinterpret_cast<GlesContext*>(static_cast<std::intptr_t>(handle)); }
-
-jstring newString(JNIEnv* env, const char* text) {
-  jstring s = env->NewStringUTF(text);
-  if (env->ExceptionCheck()) {
-    env->ExceptionClear();
-    return nullptr;
-  }
-  return s;
-}
-
-}  // namespace
+static GlesContext* fromHandle(jlong handle) { return reinterpret_cast<GlesContext*>(static_cast<std::intptr_t>(handle)); }
 
 extern "C" {
 
 JNIEXPORT jlong JNICALL Java_com_qn_tessel_test_EglContext_nativeCreate(JNIEnv*, jclass, jint width, jint height) {
-  g_error.clear();
-  if (width < 1 || height < 1) {
-    g_error = "bad size";
-    return 0;
-  }
-  auto* c = new (std::nothrow) GlesContext(width, height);
+  auto* c = width > 0 && height > 0 ? new (std::nothrow) GlesContext(width, height) : nullptr;
+  g_error = c == nullptr ? "bad size or no memory" : c->ok() ? "" : c->error();
   if (c != nullptr && !c->ok()) {
-    g_error = c->error();
     delete c;
     c = nullptr;
   }
@@ -53,12 +34,12 @@ JNIEXPORT jlong JNICALL Java_com_qn_tessel_test_EglContext_nativeCreate(JNIEnv*,
 }
 
 JNIEXPORT jstring JNICALL Java_com_qn_tessel_test_EglContext_nativeLastError(JNIEnv* env, jclass) {
-  return newString(env, g_error.c_str());
+  return env->NewStringUTF(g_error.c_str());
 }
 
 JNIEXPORT jstring JNICALL Java_com_qn_tessel_test_EglContext_nativeRenderer(JNIEnv* env, jclass) {
   const GLubyte* renderer = glGetString(GL_RENDERER);
-  return newString(env, renderer != nullptr ? reinterpret_cast<const char*>(renderer) : "");
+  return env->NewStringUTF(renderer != nullptr ? reinterpret_cast<const char*>(renderer) : "");
 }
 
 JNIEXPORT jbyteArray JNICALL Java_com_qn_tessel_test_EglContext_nativeReadPixels(JNIEnv* env, jclass, jlong handle) {
@@ -67,12 +48,9 @@ JNIEXPORT jbyteArray JNICALL Java_com_qn_tessel_test_EglContext_nativeReadPixels
   glFinish();
   const std::vector<std::uint8_t> rgba = c->readRgba();
   jbyteArray out = env->NewByteArray(static_cast<jsize>(rgba.size()));
-  if (out == nullptr || env->ExceptionCheck()) {
-    env->ExceptionClear();
-    return nullptr;
-  }
-  env->SetByteArrayRegion(out, 0, static_cast<jsize>(rgba.size()), reinterpret_cast<const jbyte*>(rgba.data()));
-  return out;
+  if (out != nullptr)
+    env->SetByteArrayRegion(out, 0, static_cast<jsize>(rgba.size()), reinterpret_cast<const jbyte*>(rgba.data()));
+  return out;  // null with OutOfMemoryError pending when the array could not be made
 }
 
 JNIEXPORT void JNICALL Java_com_qn_tessel_test_EglContext_nativeRelease(JNIEnv*, jclass, jlong handle) {

@@ -27,7 +27,7 @@ final class EglContext implements AutoCloseable {
   final int height;
   private final ExecutorService thread;
   private final long handle;
-  private final String renderer;
+  final String renderer;
 
   EglContext(int width, int height) throws Exception {
     this.width = width;
@@ -37,23 +37,14 @@ final class EglContext implements AutoCloseable {
       t.setDaemon(true);
       return t;
     });
-    long[] made = new long[1];
-    String[] text = new String[1];
-    call(() -> {
-      made[0] = nativeCreate(width, height);
-      text[0] = made[0] == 0 ? nativeLastError() : nativeRenderer();
-      return null;
-    });
-    if (made[0] == 0) {
+    final long made = call(() -> nativeCreate(width, height));
+    final String text = call(() -> made == 0 ? nativeLastError() : nativeRenderer());
+    if (made == 0) {
       thread.shutdownNow();
-      throw new IllegalStateException("no offscreen GLES 1.1 context: " + text[0]);
+      throw new IllegalStateException("no offscreen GLES 1.1 context: " + text);
     }
-    this.handle = made[0];
-    this.renderer = text[0];
-  }
-
-  String renderer() {
-    return renderer;
+    this.handle = made;
+    this.renderer = text;
   }
 
   <T> T call(Callable<T> work) throws Exception {
@@ -68,10 +59,7 @@ final class EglContext implements AutoCloseable {
   }
 
   void run(Runnable work) throws Exception {
-    call(() -> {
-      work.run();
-      return null;
-    });
+    call(Executors.callable(work));
   }
 
   /** The pbuffer as RGBA bytes, top row first (the orientation of the app's touch coordinates). */

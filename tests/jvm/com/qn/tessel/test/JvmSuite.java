@@ -3,21 +3,23 @@ package com.qn.tessel.test;
 import static com.qn.tessel.plugin.QNKbdJniLib.*;
 
 import com.qn.tessel.plugin.QNKbdJniLib;
-import java.io.File;
-import java.nio.charset.StandardCharsets;
+import com.qn.tessel.server.PemKeys;
+import com.qn.tessel.server.TesselOpener;
 import java.nio.file.Files;
+import java.nio.file.Path;
 import java.security.KeyPair;
 import java.security.KeyPairGenerator;
+import java.security.PrivateKey;
+import java.security.interfaces.RSAPrivateKey;
 import java.security.interfaces.RSAPublicKey;
+import java.util.Locale;
 
 /**
  * The JVM suite: loads the built libTesselVIP.so into a real JVM and drives keyboards only
- * through com.qn.tessel.plugin.QNKbdJniLib, as an app does. Run by CTest (tests/jvm.cmake) with
- * the paths it needs as system properties:
- *   tessel.library     libTesselVIP.so                tessel.eglHelper  libtessel_egl_test.so
- *   tessel.server      the tessel_open opener         tessel.appKey     builtin_default_key.pem
- *   tessel.tmp         a scratch directory
- * Exit status 0 when every check passed.
+ * through com.qn.tessel.plugin.QNKbdJniLib, as an app does; exit status 0 when every check
+ * passed. Run by CTest (tests/jvm.cmake) with the paths it needs as system properties: tessel.library
+ * (libTesselVIP.so), tessel.helpers (the test-only JNI helpers of tests/jvm/native), tessel.server
+ * (tessel_open, the C++ opener), tessel.appKey (builtin_default_key.pem), tessel.tmp (scratch).
  */
 public final class JvmSuite {
   /** Keyboard surface size used by every case: keys of 48 x 80 pixels. */
@@ -25,10 +27,9 @@ public final class JvmSuite {
   static final int HEIGHT = 320;
   static final String TIMESTAMP = "20260101120000";
 
-  static ServerTool server;
-  static String encKeyPem;
+  static String appModulusHex;
   static String encModulusHex;
-  static RSAPublicKey encPublicKey;
+  static TesselOpener opener;
 
   private JvmSuite() {}
 
@@ -52,44 +53,40 @@ public final class JvmSuite {
     Check.isTrue(h >= 0 && h < SESSION_SLOTS, "handle of " + name);
     setNativeMaxLength(h, (short) 64);
     setNativeAccepts(h, "[:print:]*");
-    surface(gl, h);
-    return new KeyboardDriver(h, WIDTH, HEIGHT);
-  }
-
-  static void surface(EglContext gl, int h) throws Exception {
     gl.run(() -> {
       setNativeSurfaceCreated(h);
       setNativeSurfaceChanged(h, WIDTH, HEIGHT, 1);
     });
+    return new KeyboardDriver(h, WIDTH, HEIGHT);
   }
 
-  /** The typed text as the bank's server reads it from getNativeContent (type 48). */
+  /** The typed text as the bank's server reads it from getNativeContent (type 48), by both openers. */
   static String serverContent(int h) throws Exception {
     String out = getNativeContent(h, TIMESTAMP);
-    if (out == null) {
-      Check.fail("getNativeContent returned null: " + getNativeLastError(h));
-      return null;
-    }
-    ServerTool.Result r = server.open(48, out, null);
-    Check.equal(0, r.exitCode, "tessel_open type 48 " + r);
+    Check.isTrue(out != null, "getNativeContent: " + getNativeLastError(h));
+    if (out == null) return null;
+    Bank.Result r = Bank.open(48, out, false);
+    Check.equal(0, r.exit(), "type 48 opened: " + r.stderr());
     Check.equal(TIMESTAMP, r.get("timestamp"), "timestamp in the envelope");
     return r.get("content");
   }
 
   private static void setUp() throws Exception {
-    System.load(property("tessel.eglHelper"));
+    System.load(property("tessel.helpers"));
     // The library is loaded here, before the class is initialised: its own System.loadLibrary
     // then fails (the build directory is not on java.library.path) and must not matter.
     System.load(property("tessel.library"));
-    server = new ServerTool(property("tessel.server"), property("tessel.appKey"));
+    Bank.cppTool = property("tessel.server");
+    Bank.appKeyPem = property("tessel.appKey");
+    PrivateKey app = PemKeys.read(Path.of(Bank.appKeyPem));
+    appModulusHex = ((RSAPrivateKey) app).getModulus().toString(16).toUpperCase(Locale.ROOT);
     KeyPairGenerator generator = KeyPairGenerator.getInstance("RSA");
     generator.initialize(1024);
     KeyPair enc = generator.generateKeyPair();
-    encPublicKey = (RSAPublicKey) enc.getPublic();
-    encModulusHex = Oracles.modulusHex(encPublicKey);
-    File pem = new File(property("tessel.tmp"), "enc_platform_key.pem");
-    Files.write(pem.toPath(), Oracles.pkcs8Pem(enc.getPrivate()).getBytes(StandardCharsets.US_ASCII));
-    encKeyPem = pem.getPath();
+    encModulusHex = ((RSAPublicKey) enc.getPublic()).getModulus().toString(16).toUpperCase(Locale.ROOT);
+    Path pem = Path.of(property("tessel.tmp"), "enc_platform_key.pem");
+    Bank.encKeyPem = Files.writeString(pem, Bank.pkcs8Pem(enc.getPrivate())).toString();
+    opener = TesselOpener.builder().appKey(app).encKey(enc.getPrivate()).build();
   }
 
   public static void main(String[] args) throws Exception {
@@ -99,11 +96,10 @@ public final class JvmSuite {
       Check.isTrue(QNKbdJniLib.libraryLoadFailure() != null, "the class's own loadLibrary failed as expected");
     });
     EntryPointTests.run();
-    KeyboardTests.run();
     OutputTests.run();
     RenderTests.run();
     destroyAll();
-    System.out.printf("%d checks, %d failed%n", Check.checks(), Check.failures());
-    System.exit(Check.failures() == 0 ? 0 : 1);
+    System.out.printf("%d checks failed%n", Check.failures);
+    System.exit(Check.failures == 0 ? 0 : 1);
   }
 }

@@ -31,43 +31,19 @@ final class KeyboardDriver {
 
   /** A down then an up at (x, y): the down must report -1; returns what the up reports. */
   int tap(double x, double y) {
-    int down = setNativeTouchPos(handle, QNKbdJniLib.TOUCH_DOWN, (float) x, (float) y);
-    Check.equal(-1, down, "down at (" + x + ", " + y + ")");
+    Check.equal(-1, setNativeTouchPos(handle, QNKbdJniLib.TOUCH_DOWN, (float) x, (float) y), "down at " + x + "," + y);
     return setNativeTouchPos(handle, QNKbdJniLib.TOUCH_UP, (float) x, (float) y);
   }
 
-  // ---- full keyboard: layout position 0..25 and the function keys
-
+  /** Centre of layout position 0..25 of the full keyboard. */
   double[] positionCentre(int position) {
     if (position < 10) return new double[] {(position + 0.5) * kw, 0.5 * kh};
     if (position < 19) return new double[] {(position - 10 + 0.8) * kw, 1.5 * kh};
     return new double[] {(position - 19 + 2) * kw, 2.5 * kh};
   }
 
-  int tapPosition(int position) {
-    double[] c = positionCentre(position);
-    return tap(c[0], c[1]);
-  }
-
-  int shiftKey() {
-    int r = tap(0.75 * kw, 2.5 * kh);
-    shift = !shift;
-    return r;
-  }
-
   int deleteKey() {
     return tap(9.25 * kw, 2.5 * kh);
-  }
-
-  /** The switch key with switch mode 0: toggles letters and symbols. */
-  int switchKey() {
-    int r = tap(1.25 * kw, 3.5 * kh);
-    symbolPage = !symbolPage;
-    return r;
-  }
-
-  int spaceKey() {
-    return tap(5 * kw, 3.5 * kh);
   }
 
   int doneKey() {
@@ -87,7 +63,7 @@ final class KeyboardDriver {
   /** Types one character of the unshuffled full keyboard, switching page and shift as needed. */
   void type(char c) {
     if (c == ' ') {
-      Check.equal(0, spaceKey(), "space key");
+      Check.equal(0, tap(5 * kw, 3.5 * kh), "space key");
       return;
     }
     int letter = find(LETTERS, Character.toLowerCase(c));
@@ -98,33 +74,33 @@ final class KeyboardDriver {
     // Digits are on both symbol pages: either shift state will do.
     Boolean wantShift = letter >= 0 ? Boolean.valueOf(Character.isUpperCase(c))
         : symbol >= 0 && shifted >= 0 ? null : Boolean.valueOf(shifted >= 0);
-    if (symbolPage != (letter < 0)) Check.equal(0, switchKey(), "switch key");
-    if (wantShift != null && shift != wantShift) Check.equal(0, shiftKey(), "shift key");
-    Check.equal(0, tapPosition(position), "key '" + c + "'");
+    if (symbolPage != (letter < 0)) {
+      Check.equal(0, tap(1.25 * kw, 3.5 * kh), "switch key (switch mode 0: letters and symbols)");
+      symbolPage = !symbolPage;
+    }
+    if (wantShift != null && shift != wantShift) {
+      Check.equal(0, tap(0.75 * kw, 2.5 * kh), "shift key");
+      shift = !shift;
+    }
+    double[] centre = positionCentre(position);
+    Check.equal(0, tap(centre[0], centre[1]), "key '" + c + "'");
   }
 
   void type(String text) {
     for (int k = 0; k < text.length(); ++k) type(text.charAt(k));
   }
 
-  // ---- number pad: cell (row, column), columns 2.5 keys wide
-
+  /** Number pad cell (row, column), columns 2.5 keys wide. */
   int tapPad(int row, int column) {
     return tap((column + 0.5) * 2.5 * kw, (row + 0.5) * kh);
   }
 
-  /** Types a digit or '.' on the number pad. */
-  void typePad(char c) {
-    if (c == '.') {
-      Check.equal(0, tapPad(3, 1), "pad '.'");
-      return;
-    }
-    int at = PAD.indexOf(c);
-    if (at < 0) throw new IllegalArgumentException("no pad key for " + c);
-    Check.equal(0, tapPad(at / 3, at % 3), "pad '" + c + "'");
-  }
-
+  /** Types digits and '.' on the number pad. */
   void typePad(String text) {
-    for (int k = 0; k < text.length(); ++k) typePad(text.charAt(k));
+    for (char c : text.toCharArray()) {
+      int at = c == '.' ? 10 : PAD.indexOf(c);
+      if (at < 0) throw new IllegalArgumentException("no pad key for " + c);
+      Check.equal(0, at == 10 ? tapPad(3, 1) : tapPad(at / 3, at % 3), "pad '" + c + "'");
+    }
   }
 }
