@@ -91,7 +91,7 @@ int createSession(const char* name) noexcept {
     delete session;
     return -1;
   }
-  session->keyMask = static_cast<std::uint8_t>(rand48Next() & 31);
+  session->keyMask = drawKeyMask();
   store->randomByte = static_cast<std::uint8_t>(rand48Next());
   rc4Init(store->cipherState, kSealKey, sizeof kSealKey);
   session->content = store;
