@@ -26,7 +26,7 @@ if(_tessel_demo_options)
   set(_tessel_demo_text
     "${_tessel_which} point at the demo deployment data committed with the source "
     "(src/crypto/builtin_moduli.inc, whose default modulus has its private key in "
-    "tests/data/builtin_default_key.pem; src/crypto/master_keys.inc). Anyone can open what "
+    "tests/data/builtin_default_key.pem, and src/crypto/master_keys.inc). Anyone can open what "
     "such a library seals. Make production data outside the source tree with\n"
     "    tools/keys/make_deployment.sh -c <config dir> -s <secrets dir>\n"
     "and configure with -C <config dir>/deployment.cmake, which sets "
