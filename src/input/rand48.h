@@ -4,7 +4,7 @@
 // The layout builder draws with lrand48() and reseeds with srand48(time(NULL)) after each
 // shuffle; session creation draws keyMask and randomByte from the same stream. Both supported
 // C libraries (glibc, bionic) provide lrand48/srand48, so the stream is the platform's own.
-// Not a cryptographic source: secrets come from randomBytes().
+// The lrand48 stream is not a cryptographic source: secrets come from randomBytes().
 #pragma once
 
 #include <cstddef>
