@@ -13,6 +13,14 @@ cmake -S . -B build -G Ninja -DCMAKE_BUILD_TYPE=Release -DTESSEL_WERROR=ON >/dev
 cmake --build build -j"$jobs"
 ctest --test-dir build --output-on-failure -j"$jobs"
 
+echo "== strong layout randomness (-DTESSEL_STRONG_LAYOUT_RANDOM=ON): the suites that draw layouts"
+# The other layout suite checks the default generator's exact draws, so it stays out of this build.
+strong_suites="input_layout_random_test session_test input_typing_test"
+cmake -S . -B build-strong -G Ninja -DCMAKE_BUILD_TYPE=Release -DTESSEL_WERROR=ON \
+      -DTESSEL_STRONG_LAYOUT_RANDOM=ON -DTESSEL_ALLOW_DEMO_KEYS=ON >/dev/null
+cmake --build build-strong -j"$jobs" --target $strong_suites
+ctest --test-dir build-strong --output-on-failure -j"$jobs" -R "^(${strong_suites// /|})\$"
+
 echo "== ThreadSanitizer: the UI/GL thread stress suite"
 bash tools/run_tsan.sh
 

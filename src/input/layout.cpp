@@ -41,9 +41,22 @@ void shuffleRow(std::uint8_t* row, std::size_t n) noexcept {
   }
 }
 
+// Fisher-Yates: every one of the n! orders equally likely.
+void shuffleRowUniform(std::uint8_t* row, std::size_t n) noexcept {
+  for (std::size_t i = n; i > 1; --i) {
+    const std::size_t j = osRandomBelow(static_cast<std::uint32_t>(i));
+    std::swap(row[i - 1], row[j]);
+  }
+}
+
 void fillRow(std::uint8_t* row, const char* source, std::size_t n, bool shuffle) noexcept {
   for (std::size_t i = 0; i < n; ++i) row[i] = static_cast<std::uint8_t>(source[i]);
-  if (shuffle) shuffleRow(row, n);
+  if (!shuffle) return;
+  if (kStrongLayoutRandom) {
+    shuffleRowUniform(row, n);
+  } else {
+    shuffleRow(row, n);
+  }
 }
 
 template <std::size_t N>
@@ -97,9 +110,11 @@ void buildLayout(KeyboardSession& session) noexcept {
 
   session.layoutBuilt = 1;
   session.symbolPage = static_cast<std::uint32_t>(static_cast<std::int32_t>(session.kbdPage.load()));
-  // Seeded after the shuffles: the next build draws from the state this seeding leaves.
-  rand48Seed(static_cast<long>(std::time(nullptr)));
+  // Seeded after the shuffles: the next build draws from the state this seeding leaves. A
+  // strong-random build draws nothing from this stream, so it has nothing to seed.
+  if (!kStrongLayoutRandom) rand48Seed(static_cast<long>(std::time(nullptr)));
 }
+
 
 void applySurfaceGeometry(KeyboardSession& session, int width, int height, int variant) noexcept {
   const auto v = static_cast<std::uint32_t>(variant);

@@ -7,7 +7,9 @@
 //   symbolsUpper   the same digits as symbolsLower, "{}[]\|:;'" and "\",.<>/?"
 //   padDigits      "1234567890", read as a 4 x 3 grid by the number pad
 // With kbdRandom each row is shuffled within itself (n random transpositions drawn from
-// rand48Next()); both symbol pages always share one digit order.
+// rand48Next()); both symbol pages always share one digit order. Builds configured with
+// TESSEL_STRONG_LAYOUT_RANDOM shuffle each row uniformly (Fisher-Yates) from the operating
+// system's random source instead, never reseed from the clock, and draw keyMask from 1..31.
 //
 // Key grid (kw = keyWidth, kh = keyHeight, rows of kh from the top):
 //   full keyboard row 0: 10 keys from x = 0; row 1: 9 keys from 0.3 kw (dead zones x <= 0.3 kw

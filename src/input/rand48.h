@@ -1,18 +1,42 @@
-// The 48-bit linear congruential generator behind key-row shuffling and session masks.
+// Random sources of the keyboard layout: the C library's 48-bit linear congruential generator
+// and, for builds with TESSEL_STRONG_LAYOUT_RANDOM, the operating system's random source.
 //
 // The layout builder draws with lrand48() and reseeds with srand48(time(NULL)) after each
-// shuffle; session creation draws keyMask and randomByte from the same stream. Where libc
-// provides lrand48/srand48 (glibc, bionic) they are used, so the stream is the platform's;
-// elsewhere an equivalent generator (a = 0x5DEECE66D, c = 0xB, 48-bit state, top 31 bits out)
-// stands in. Not a cryptographic source: secrets come from randomBytes().
+// shuffle; session creation draws keyMask and randomByte from the same stream. Both supported
+// C libraries (glibc, bionic) provide lrand48/srand48, so the stream is the platform's own.
+// The lrand48 stream is not a cryptographic source: secrets come from randomBytes().
 #pragma once
 
+#include <cstddef>
+#include <cstdint>
+
 namespace tessel {
+
+// TESSEL_STRONG_LAYOUT_RANDOM is a public definition of the core library, so every target that
+// links it agrees on this value.
+#ifdef TESSEL_STRONG_LAYOUT_RANDOM
+constexpr bool kStrongLayoutRandom = true;
+#else
+constexpr bool kStrongLayoutRandom = false;
+#endif
 
 // A non-negative 31-bit value, as lrand48().
 long rand48Next() noexcept;
 
 // Seeds as srand48(seed): high 32 bits of the state from seed, low 16 bits 0x330E.
 void rand48Seed(long seed) noexcept;
+
+// Fills buffer with n bytes from getrandom(2), or from /dev/urandom where the kernel lacks the
+// call. False only when neither source delivers all n bytes.
+bool osRandomBytes(void* buffer, std::size_t n) noexcept;
+
+// Uniform in [0, bound), bound >= 1, from osRandomBytes (rejection sampling, no modulo bias).
+// Should both OS sources fail, the draw comes from the lrand48 stream instead, so a sandbox
+// that hides them gets the ordinary shuffle rather than none.
+std::uint32_t osRandomBelow(std::uint32_t bound) noexcept;
+
+// keyMask for a new session: lrand48() & 31 from the shared stream; in a strong-random build a
+// value 1..31 from the operating system (never 0, so no table is ever stored unmasked).
+std::uint8_t drawKeyMask() noexcept;
 
 }  // namespace tessel

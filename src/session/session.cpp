@@ -101,7 +101,7 @@ int createSession(const char* name) noexcept {
   session->sessionName = sessionName;
   store->algorithmCode = algorithmCode;
   session->content = store;
-  session->keyMask = static_cast<std::uint8_t>(rand48Next() & 31);
+  session->keyMask = drawKeyMask();
   store->randomByte = static_cast<std::uint8_t>(rand48Next());
   rc4Init(store->cipherState, kSealKey, sizeof kSealKey);
 

@@ -331,36 +331,83 @@ public final class QNKbdJniLib {
 
   /**
    * Application platform public key: a hex RSA modulus, or, when {@code isDer}, the hex of a DER
-   * {@code SEQUENCE { INTEGER n, INTEGER 65537 }} (an unreadable DER clears the key). Stored
-   * only; the outputs use the built-in key in that place. A null key is ignored.
+   * {@code SEQUENCE { INTEGER n, INTEGER 65537 }}. Stored only; the outputs use the built-in key
+   * in that place, so a refused key changes no output. A null key is ignored.
+   *
+   * <p>Refused keys: with {@code isDer}, anything but that exact structure (another exponent, a
+   * {@code SubjectPublicKeyInfo} or PEM text, a modulus over 2240 bits, a character that is not
+   * a hex digit): the stored key is cleared, and nothing is reported. A hex modulus is stored
+   * as given, unchecked.
    */
   public static native void setNativeAppPlat(int handle, String key, boolean isDer);
 
-  /** Encryption platform public key, as {@link #setNativeAppPlat}; used by {@link #getNativePinContent}. */
+  /**
+   * Encryption platform public key for {@link #getNativePinContent}, in the forms of
+   * {@link #setNativeAppPlat}. A null key is ignored. Nothing is checked here: a bad key shows
+   * only when {@link #getNativePinContent} returns null and {@link #getNativeLastError} says
+   * <ul>
+   *   <li>"The encryption platform modulus is missing!" for a DER text that is refused (another
+   *       exponent, a {@code SubjectPublicKeyInfo}, a modulus over 2240 bits, a non-hex
+   *       character): the refusal also cleared any key set before; and for an empty text;</li>
+   *   <li>"Adding PKCS1 padding failed!" for a hex modulus over 2240 bits (560 digits), one with
+   *       a character that is not a hex digit (a space, a {@code 0x} prefix), or one too short
+   *       for a padded block.</li>
+   * </ul>
+   */
   public static native void setNativeEncryPlat(int handle, String key, boolean isDer);
 
-  /** As {@code setNativeAppPlat(handle, hex, false)}. @return 1 taken; 0 for a null key or bad handle */
+  /**
+   * As {@code setNativeAppPlat(handle, hex, false)}: stored unchecked and read by no output.
+   *
+   * @return 1 stored, whatever the text holds; 0 for a null key or bad handle
+   */
   public static native int setNativePublicKeyAppModulus(int handle, String hex);
 
-  /** As {@code setNativeAppPlat(handle, der, true)}. @return 1 taken; 0 for a null key or bad handle */
+  /**
+   * As {@code setNativeAppPlat(handle, der, true)}: a DER text that is refused (see there)
+   * clears the key; read by no output.
+   *
+   * @return 1, also when the DER text was refused; 0 for a null key or bad handle
+   */
   public static native int setNativePublicKeyAppDER(int handle, String der);
 
   /**
    * Application key from the hex of a 20-byte key-blob header followed by the key bytes, least
-   * significant first; the reversed bytes are read as DER (white space in the hex is skipped).
+   * significant first; the reversed bytes are read as DER (white space in the hex is skipped,
+   * other non-hex characters count as 0). A blob whose bytes do not form the DER of
+   * {@link #setNativeAppPlat} (or hold a modulus over 2240 bits) clears the key; read by no output.
    *
    * @return 1 once the text was read, also when the key it holds is refused (the key is then
    *     cleared); 0 for a null text or a bad handle
    */
   public static native int setNativePublicKeyAppBlob(int handle, String blobHex);
 
-  /** As {@code setNativeEncryPlat(handle, hex, false)}. @return 1 taken; 0 for a null key or bad handle */
+  /**
+   * As {@code setNativeEncryPlat(handle, hex, false)}: stored unchecked. A modulus over 2240
+   * bits (560 hex digits), with a non-hex character or too short makes the next
+   * {@link #getNativePinContent} return null with "Adding PKCS1 padding failed!".
+   *
+   * @return 1 stored, also for such a modulus; 0 for a null key or bad handle
+   */
   public static native int setNativePublicKeyModulus(int handle, String hex);
 
-  /** As {@code setNativeEncryPlat(handle, der, true)}. @return 1 taken; 0 for a null key or bad handle */
+  /**
+   * As {@code setNativeEncryPlat(handle, der, true)}. A refused DER text (another exponent, a
+   * {@code SubjectPublicKeyInfo}, a modulus over 2240 bits, a non-hex character) clears the key:
+   * the next {@link #getNativePinContent} returns null with "The encryption platform modulus is
+   * missing!".
+   *
+   * @return 1, also when the DER text was refused; 0 for a null key or bad handle
+   */
   public static native int setNativePublicKeyDER(int handle, String der);
 
-  /** Encryption key from a key blob, as {@link #setNativePublicKeyAppBlob}. @return 1 / 0 as there */
+  /**
+   * Encryption key from a key blob, read as {@link #setNativePublicKeyAppBlob} reads it. A
+   * refused blob clears the key: the next {@link #getNativePinContent} returns null with "The
+   * encryption platform modulus is missing!".
+   *
+   * @return 1 / 0 as {@link #setNativePublicKeyAppBlob}, 1 also for a refused blob
+   */
   public static native int setNativePublicKeyBlob(int handle, String blobHex);
 
   /** Stores an elliptic-curve public key "x,y" (kept only). @return 1 stored; 0 when x or y is null */
