@@ -76,9 +76,11 @@ def real_ns(b):
 def spread(values, fmt):
     """The median, or "min–max" when the runs vary by more than SPREAD."""
     lo, hi, mid = min(values), max(values), statistics.median(values)
-    if mid and (hi - lo) / mid > SPREAD and fmt(lo) != fmt(hi):
-        return f"{fmt(lo)}–{fmt(hi)}"
-    return fmt(mid)
+    a, b = fmt(lo), fmt(hi)
+    if not mid or (hi - lo) / mid <= SPREAD or a == b:
+        return fmt(mid)
+    unit = re.search(r"[^0-9.]*$", b).group()  # "17.9–19.2 µs" rather than "17.9 µs–19.2 µs"
+    return f"{a[:-len(unit)]}–{b}" if unit and a.endswith(unit) else f"{a}–{b}"
 
 
 def duration(ns):
@@ -93,7 +95,7 @@ def rate(bytes_per_s):
 
 
 def times(x):
-    return f"{x:.3g}×" if x < 10 else f"{x:.0f}×"
+    return f"{x:.2f}×" if x < 10 else f"{x:.0f}×"
 
 
 def paired(ours, peer, f):
