@@ -61,7 +61,8 @@ def load(run_dir):
         for b in data.get("benchmarks", []):
             if b.get("run_type", "iteration") != "iteration" or b.get("error_occurred"):
                 continue
-            runs.setdefault((program, b.get("run_name", b["name"])), []).append(b)
+            name = b.get("run_name", b["name"]).replace("/real_time", "")  # UseRealTime() suffix
+            runs.setdefault((program, name), []).append(b)
     return runs
 
 
@@ -159,7 +160,8 @@ def main():
     block = [
         BEGIN,
         f"Measured {meta['date']} on {meta['machine']}, load average {meta['load_before']} before and "
-        f"{meta['load_after']} after the run (1, 5, 15 min), {meta['repetitions']} repetitions of each benchmark, "
+        f"{meta['load_after']} after the run (1, 5, 15 min), {meta['repetitions']} repetitions of "
+        f"{meta.get('min_time', '0.5')} s of each benchmark, "
         f"ours and the peer in the same program; CPU time per operation, ratios per repetition; a range "
         f"(min–max) where the repetitions differ by more than {SPREAD:.0%}.",
         "",
