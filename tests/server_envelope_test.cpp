@@ -83,7 +83,7 @@ TEST(ServerPayloads, WrapperKeyouBlocksAndLengthPrefixedPairs) {
   // Each row: the text, whether it parses, and the fields it gives ("|" between two fields).
   const std::string filler(20, '\x5a');
   const struct {
-    char kind;  // W wrapper, K Keyou block, P length-prefixed pair
+    char kind;  // W wrapper (L: split at the last ':'), K Keyou block, P length-prefixed pair
     std::string in;
     bool ok;
     std::string fields;
@@ -91,6 +91,8 @@ TEST(ServerPayloads, WrapperKeyouBlocksAndLengthPrefixedPairs) {
       {'W', "S1700000000:pay:load", true, "S|1700000000|pay:load"},
       {'W', "E:", true, "E||"},
       {'W', "", false, ""}, {'W', "S", false, ""}, {'W', "S123", false, ""}, {'W', "X123:abc", false, ""},
+      {'L', "S2024-01-01 12:00:00:0A1B", true, "S|2024-01-01 12:00:00|0A1B"}, {'L', "E:", true, "E||"},
+      {'L', "S123", false, ""}, {'L', ":123", false, ""},
       {'K', "05hello" + filler, true, "hello"},
       {'K', "01x" + filler, true, "x"},
       {'K', "00" + filler, false, ""}, {'K', "99abc", false, ""}, {'K', "a5hello", false, ""},
@@ -106,8 +108,8 @@ TEST(ServerPayloads, WrapperKeyouBlocksAndLengthPrefixedPairs) {
     std::string a, b, error, fields;
     server::Wrapped w;
     bool ok = false;
-    if (c.kind == 'W') {
-      ok = server::splitWrapped(c.in, &w, &error);
+    if (c.kind == 'W' || c.kind == 'L') {
+      ok = server::splitWrapped(c.in, &w, &error, c.kind == 'L');
       fields = std::string(1, w.strength) + "|" + w.timestamp + "|" + w.payload;
     } else if (c.kind == 'K') {
       ok = server::parseKeyouBlock(c.in, &a, &error);
@@ -180,6 +182,14 @@ TEST(ServerPayloads, RsaLayoutsAndPinKeyDerivationAgainstOpenSsl) {
   }
   EXPECT_FALSE(server::openPkcs1Hex(appKey(), toHex(cipher), &plain, &error)) << "2048-bit value, 1024-bit key";
   EXPECT_FALSE(server::openPkcs1Hex(encKey(), "zz", &plain, &error));
+  // A timestamp with ':' before an RSA payload; without the encryption key it stays sealed.
+  server::OpenKeys keys{&appKey(), &encKey(), "", false};
+  server::Opened out;
+  const std::string type10 = opensslEnvelope(appKey(), kRc4Key, 512, "S2024-01-01 12:00:00:" + toHex(cipher));
+  ASSERT_TRUE(server::openOutput(10, type10, keys, &out, &error)) << error;
+  EXPECT_EQ(out.timestamp + "|" + out.content, "2024-01-01 12:00:00|hello");
+  keys.enc = nullptr;
+  EXPECT_TRUE(server::openOutput(10, type10, keys, &out, &error) && !out.contentOpened) << error;
 
   // Type 68: the PIN key is B decrypted under (A decrypted under the master key).
   const Bytes master = fromHex("0123456789abcdeffedcba9876543210");
@@ -197,11 +207,11 @@ TEST(ServerPayloads, RsaLayoutsAndPinKeyDerivationAgainstOpenSsl) {
 
 TEST(ServerCli, OpensAnEnvelopeAndChecksTheSaltedHash) {
   const std::string value = expectedSaltedHash("pw", "salt", 'S');
-  const std::string envelope = opensslEnvelope(appKey(), kRc4Key, 512, "W1700000000:" + value);
+  const std::string envelope = opensslEnvelope(appKey(), kRc4Key, 512, "W2024-01-01 12:00:00:" + value);
   const std::string key = dataPath("dispatch_app_key_1024.pem");
   CliRun run = runOpenCli({"--type", "48", "--key", key, "--password", "pw", "--salt", "salt", envelope});
   EXPECT_EQ(run.status, 0) << run.err;
-  EXPECT_EQ(run.out, "strength: W\ntimestamp: 1700000000\npayload: " + value + "\ncontent: " + value +
+  EXPECT_EQ(run.out, "strength: W\ntimestamp: 2024-01-01 12:00:00\npayload: " + value + "\ncontent: " + value +
                          "\npassword: match\n");
   EXPECT_EQ(run.err, "");
   run = runOpenCli({"--type", "48", "--key", key, "--password", "pw2", "--salt", "salt", "-"}, envelope + "\n");
@@ -209,11 +219,11 @@ TEST(ServerCli, OpensAnEnvelopeAndChecksTheSaltedHash) {
   EXPECT_NE(run.out.find("password: mismatch"), std::string::npos);
   run = runOpenCli({"--layout", envelope});
   EXPECT_EQ(run.status, 0);
-  EXPECT_EQ(run.out, "key-blob-length: 140\nrsa-length: 128\ncontent-length: 28\ntotal-length: 184\n");
+  EXPECT_EQ(run.out, "key-blob-length: 140\nrsa-length: 128\ncontent-length: 37\ntotal-length: 193\n");
 }
 
 TEST(ServerCli, BadInputGivesOneLineAndNonZeroExit) {
-  const std::string good = opensslEnvelope(appKey(), kRc4Key, 512, "S1700000000:hello");
+  const std::string good = opensslEnvelope(appKey(), kRc4Key, 512, "S1700000000:c359e5975c5a3f45");  // 48
   const std::string app = dataPath("dispatch_app_key_1024.pem");
   Bytes raw = opensslBase64Decode(good);
   raw.resize(raw.size() - 6);
@@ -226,15 +236,17 @@ TEST(ServerCli, BadInputGivesOneLineAndNonZeroExit) {
       {"truncated", {"--key", app, opensslBase64(raw)}, 1},
       {"foreign", {"--key", dataPath("dispatch_foreign_key_1024.pem"), good}, 1},
       {"garbage", {"--key", app, "hello world"}, 1},
-      {"key file missing", {"--key", "/nonexistent.pem", good}, 1},
-      {"key file not PEM", {"--key", dataPath("SOURCES.md"), good}, 1},
-      {"unknown type", {"--type", "65", "--key", app, good}, 1},
-      {"no key", {good}, 1},
+      {"type 48 opened as 47", {"--type", "47", "--key", app, good}, 1},
+      {"key file missing", {"--key", "/nonexistent.pem", good}, 2},
+      {"key file not PEM", {"--key", dataPath("SOURCES.md"), good}, 2},
+      {"unknown type", {"--type", "65", "--key", app, good}, 2},
+      {"no key", {good}, 2},
+      {"no encryption key for type 30", {"--type", "30", "--key", app, good}, 2},
       {"no output", {"--key", app}, 2},
       {"unknown option", {"--frobnicate", good}, 2},
       {"bad type", {"--type", "x1", good}, 2},
       {"salt without password", {"--key", app, "--salt", "s", good}, 2},
-      {"wrong password", {"--type", "0", "--key", app, "--password", "hellO", good}, 3},
+      {"wrong password", {"--type", "0", "--key", app, "--password", "c359e5975c5a3f4", good}, 3},
   };
   for (const auto& c : cases) {
     const CliRun run = runOpenCli(c.args);

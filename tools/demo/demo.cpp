@@ -1,7 +1,8 @@
 // The road of one password, driven the way an app drives the library: a session is configured,
 // its three GL surfaces are created offscreen on OpenGL ES 1.1, a password is typed by touch on
 // the shuffled keyboard, and the outputs are opened again with the server-side tool, as the
-// bank's backend would. Frames of what the user sees are written as PNG files.
+// bank's backend would. Frames of what the user sees are written as PNG files, the two outputs
+// as .b64 files next to them, with the tessel_open commands that open them.
 //
 // With --window (when built with GLFW) the keyboard is shown in a window instead and typed by
 // hand with the mouse (window.h).
@@ -133,7 +134,7 @@ int main(int argc, char** argv) {
     return 2;
   }
 #endif
-  if (!window) mkdir(outDir.c_str(), 0755);
+  mkdir(outDir.c_str(), 0755);
 
   std::printf(window ? "Tessel demo: the keyboard in a window, typed by hand\n\n"
                      : "Tessel demo: one password from the keyboard to the bank's backend\n\n");
@@ -149,6 +150,7 @@ int main(int argc, char** argv) {
   if (s == nullptr) return 1;
 #if TESSEL_DEMO_WINDOW
   if (window) {
+    windowOptions.outDir = outDir;
     const int status = demo::runWindow(*s, backendKeys.openKeys(), windowOptions);
     destroySession(handle);
     return status;
@@ -217,6 +219,14 @@ int main(int argc, char** argv) {
   check(openedPinContent && openedPin.contentOpened && openedPin.content == expected,
         openedPinContent ? "PIN content: envelope and inner RSA payload opened, same salted value"
                          : ("PIN content: " + error).c_str());
+
+  const std::string commands[] = {
+      demo::saveForBackend(outDir, "content_48.b64", 48, content, kPassword),
+      demo::saveForBackend(outDir, "pin_content_47.b64", 47, pinContent, kPassword)};
+  check(!commands[0].empty() && !commands[1].empty(), ("both outputs saved in " + outDir).c_str());
+  std::printf("\nOpen them yourself, from the repository root, as the bank's backend does (demo keys,\n"
+              "stored password and salt); each prints the opened fields and \"password: match\":\n");
+  for (const std::string& command : commands) std::printf("  %s\n", command.c_str());
 
   destroySession(handle);
   const bool passed = demo::failures() == 0;

@@ -1,7 +1,9 @@
 // Shared steps of the demo's two modes: check lines, keys, session settings, envelope opening.
 #include "road.h"
 
+#include <climits>
 #include <cstdio>
+#include <cstdlib>
 #include <ctime>
 
 #include "session/session.h"
@@ -76,6 +78,41 @@ bool openContent(const SecureBuffer& content, const server::OpenKeys& keys, serv
     std::printf("  strength '%c', timestamp %s, salted value %s\n", opened->strength, opened->timestamp.c_str(),
                 opened->payload.c_str());
   return ok;
+}
+
+namespace {
+
+// A path as the user types it from the repository root: relative when it lies inside it.
+std::string fromRoot(const std::string& path) {
+  char resolved[PATH_MAX], root[PATH_MAX];
+  if (realpath(path.c_str(), resolved) == nullptr || realpath(TESSEL_SOURCE_DIR, root) == nullptr) return path;
+  const std::string r = resolved, prefix = std::string(root) + "/";
+  return r.compare(0, prefix.size(), prefix) == 0 ? r.substr(prefix.size()) : r;
+}
+
+std::string shellWord(const std::string& word) {
+  if (!word.empty() && word.find_first_not_of("abcdefghijklmnopqrstuvwxyzABCDEFGHIJKLMNOPQRSTUVWXYZ0123456789_./-=") ==
+                           std::string::npos)
+    return word;
+  std::string quoted = "'";
+  for (char c : word) quoted += c == '\'' ? std::string("'\\''") : std::string(1, c);
+  return quoted + "'";
+}
+
+}  // namespace
+
+std::string saveForBackend(const std::string& dir, const char* name, int type, const SecureBuffer& output,
+                           const char* password) {
+  const std::string path = dir + "/" + name;
+  FILE* file = output ? std::fopen(path.c_str(), "w") : nullptr;
+  const bool written = file != nullptr && std::fprintf(file, "%s\n", output.c_str()) > 0;
+  if (file != nullptr && std::fclose(file) != 0) return std::string();
+  if (!written) return std::string();
+  std::string command = shellWord(fromRoot(TESSEL_OPEN_PATH)) + " --type " + std::to_string(type) + " --key " +
+                        shellWord(fromRoot(sourcePath("tests/data/builtin_default_key.pem")));
+  if (type == 47) command += " --enc-key " + shellWord(fromRoot(sourcePath("tools/demo/demo_encryption_key.pem")));
+  if (password != nullptr) command += " --password " + shellWord(password) + " --salt " + kSalt + " --mode S";
+  return command + " - < " + shellWord(fromRoot(path));
 }
 
 }  // namespace demo

@@ -42,4 +42,10 @@ std::string utcTimestamp();
 bool openContent(const tessel::SecureBuffer& content, const tessel::server::OpenKeys& keys,
                  tessel::server::Opened* opened);
 
+// Writes an output of `type` (47 or 48) to dir/name as one line of base64, so a backend can open
+// it, and returns the tessel_open command that does so from the repository root with the demo
+// keys and, when given, the stored password and the salt. Empty when the file cannot be written.
+std::string saveForBackend(const std::string& dir, const char* name, int type, const tessel::SecureBuffer& output,
+                           const char* password);
+
 }  // namespace demo

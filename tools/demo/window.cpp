@@ -306,7 +306,7 @@ bool writeScreenshot(const std::string& path, int width, int height) {
 }
 
 // What the app and then the backend see when done is released: no plaintext.
-void reportDone(KeyboardSession& s, const server::OpenKeys& keys, int count) {
+void reportDone(KeyboardSession& s, const server::OpenKeys& keys, int count, const std::string& outDir) {
   std::printf("\nDone released (%d): app side\n", count);
   std::printf("  getNativeContentLen -> %d\n", contentLength(s));
   std::printf("  getNativeDegree -> '%c' (E empty, W weak, M medium, S strong)\n", sessionDegree(s));
@@ -322,6 +322,10 @@ void reportDone(KeyboardSession& s, const server::OpenKeys& keys, int count) {
   }
   server::Opened opened;
   openContent(content, keys, &opened);
+  const std::string name = "window_content_" + std::to_string(count) + ".b64";
+  const std::string command = saveForBackend(outDir, name.c_str(), 48, content, nullptr);
+  check(!command.empty(), ("content output saved as " + outDir + "/" + name).c_str());
+  if (!command.empty()) std::printf("  open it again from the repository root:\n    %s\n", command.c_str());
 }
 
 }  // namespace
@@ -385,7 +389,7 @@ int runWindow(KeyboardSession& s, const server::OpenKeys& keys, const WindowOpti
     }
     if (state.doneReleased) {
       state.doneReleased = false;
-      reportDone(s, keys, ++dones);
+      reportDone(s, keys, ++dones, options.outDir);
       // Shown again, as an app shows its keyboard once more: new surfaces, a new layout.
       deleteSurfaceTextures(s);
       createSurfaces(s);

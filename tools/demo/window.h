@@ -12,7 +12,8 @@
 // Mouse: left press on the keyboard = touch down (action 0), drag = move (2), release = up (1),
 // in keyboard-surface pixels. Escape or closing the window quits. When done is released the
 // length, degree and verdict are printed, the content output (type 48) is opened with the server
-// library and its strength, timestamp and salted value printed; then the surfaces are created
+// library and its strength, timestamp and salted value printed, and the output is saved with the
+// tessel_open command that opens it; then the surfaces are created
 // again as when an app shows the keyboard once more (new layout, the field keeps its text).
 #pragma once
 
@@ -31,6 +32,7 @@ struct WindowOptions {
   int width = 720;             // window width in screen units; height is width * 5 / 6
   bool exitAfterDone = false;  // quit after the first done
   std::string screenshot;      // PNG of the framebuffer, rewritten after each done and at exit
+  std::string outDir = ".";    // where each done's content output is saved (window_content_N.b64)
 };
 
 // Runs the window until the user quits (or the first done with exitAfterDone). Prints the

@@ -308,10 +308,10 @@ bool openEnvelope(const std::string& base64, const PrivateKey& key, std::size_t 
   return cipherPass("RC4", legacyContext(), true, rc4Key, drop, sealed, content, error);
 }
 
-bool splitWrapped(const std::string& content, Wrapped* out, std::string* error) {
+bool splitWrapped(const std::string& content, Wrapped* out, std::string* error, bool atLastColon) {
   if (content.size() < 2) return fail(error, "wrapped content too short");
-  const std::size_t colon = content.find(':', 1);
-  if (colon == std::string::npos) return fail(error, "wrapped content has no ':' after the timestamp");
+  const std::size_t colon = atLastColon ? content.rfind(':') : content.find(':', 1);
+  if (colon == std::string::npos || colon == 0) return fail(error, "wrapped content has no ':' after the timestamp");
   const char letter = content[0];
   if (std::strchr("EWMSTR", letter) == nullptr || letter == '\0')
     return fail(error, "wrapped content does not start with a strength letter");
@@ -599,6 +599,30 @@ bool openInner(Inner inner, const std::string& value, const PrivateKey& key, con
   return true;
 }
 
+// A payload left sealed (no encryption key given) must still look like what the type carries:
+// an RSA value of at least 512 bits as hex or base64, with type 5's "0001" tail or type 38's
+// 16-digit block in front. Otherwise the output was made with another type (e.g. 48 opened as
+// 47) and would pass unnoticed.
+bool checkSealedShape(Inner inner, const std::string& payload, std::string* error) {
+  std::string rsa = payload, raw;
+  bool ok = true;
+  if (inner == Inner::KeyouBase64 || inner == Inner::Pkcs1Base64 || inner == Inner::PairPkcs1Base64) {
+    ok = base64ToBytes(payload, &raw, "payload", error);
+  } else {
+    if (inner == Inner::Type5) {
+      ok = rsa.size() > 4 && rsa.compare(rsa.size() - 4, 4, "0001") == 0;
+      if (ok) rsa.resize(rsa.size() - 4);
+    } else if (inner == Inner::Type38) {
+      ok = rsa.size() > 16 && hexToBytes(rsa.substr(0, 16), &raw, "payload", error);
+      if (ok) rsa.erase(0, 16);
+    }
+    ok = ok && hexToBytes(rsa, &raw, "payload", error);
+  }
+  if (!ok || raw.size() < 64)
+    return fail(error, "the payload is not the RSA value this type carries (an output of another type?)");
+  return true;
+}
+
 }  // namespace
 
 bool openOutput(int type, const std::string& output, const OpenKeys& keys, Opened* out, std::string* error) {
@@ -627,14 +651,15 @@ bool openOutput(int type, const std::string& output, const OpenKeys& keys, Opene
     return true;
   }
   Wrapped parts;
-  if (!splitWrapped(content, &parts, error)) return false;
+  const bool plainText = t.inner == Inner::Text || (t.inner == Inner::Hashed && !keys.saltedHash);
+  if (!splitWrapped(content, &parts, error, !plainText)) return false;
   out->wrapped = true;
   out->strength = parts.strength;
   out->timestamp = parts.timestamp;
   out->payload = parts.payload;
   wipeString(&parts.payload);
   if (t.inner == Inner::Text || t.inner == Inner::Hashed) return openInner(t.inner, out->payload, *keys.app, keys, out, error);
-  if (keys.enc == nullptr) return true;  // the payload stays sealed
+  if (keys.enc == nullptr) return checkSealedShape(t.inner, out->payload, error);  // stays sealed
   return openInner(t.inner, out->payload, *keys.enc, keys, out, error);
 }
 

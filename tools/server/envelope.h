@@ -83,14 +83,16 @@ bool parseEnvelope(const std::string& base64, EnvelopeLayout* layout, std::strin
 bool openEnvelope(const std::string& base64, const PrivateKey& key, std::size_t drop,
                   std::string* content, std::string* error);
 
-// Splits "letter timestamp ':' payload" at the first ':' after the letter (so a timestamp must
-// not contain ':'; the payload may).
+// Splits "letter timestamp ':' payload". Hex and base64 payloads hold no ':', so they are split
+// at the last ':' and the timestamp may contain any (e.g. "2024-01-01 12:00:00"). A plain-text
+// payload may hold ':' itself, so it is split at the first ':' after the letter: apps that
+// send plain text must use a timestamp without ':'.
 struct Wrapped {
   char strength = 0;
   std::string timestamp;
   std::string payload;
 };
-bool splitWrapped(const std::string& content, Wrapped* out, std::string* error);
+bool splitWrapped(const std::string& content, Wrapped* out, std::string* error, bool atLastColon = false);
 
 // ---- RSA payloads (all with the encryption-platform key unless the type says otherwise)
 
@@ -146,6 +148,7 @@ struct OpenKeys {
   const PrivateKey* app = nullptr;   // envelope types and 56, 73
   const PrivateKey* enc = nullptr;   // RSA payloads and the direct types 3, 4, 22, 29, 30
   std::string pinKey;                // type 68: 16 raw bytes (derivePinKey68)
+  bool saltedHash = false;           // types 48, 59: the app set a hash salt, so the payload is hex
 };
 
 struct Opened {
@@ -158,8 +161,9 @@ struct Opened {
 };
 
 // Opens the output of `type`. The application key is required for envelopes and types 56/73;
-// the encryption key is optional for envelopes (content then stays unopened) and required for
-// the direct types 3, 4, 22, 29, 30. Type 68 needs keys.pinKey to open its PIN.
+// the encryption key is optional for envelopes (content then stays unopened, but its shape is
+// still checked, so an output of another type is refused) and required for the direct types
+// 3, 4, 22, 29, 30. Type 68 needs keys.pinKey to open its PIN.
 bool openOutput(int type, const std::string& output, const OpenKeys& keys, Opened* out,
                 std::string* error);
 

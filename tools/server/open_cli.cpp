@@ -27,9 +27,13 @@ const char kUsage[] =
     "                for types 47 48 55 59 (with --salt and --mode; no --salt when the app set\n"
     "                no hash random), SHA-1 for type 5, the text itself for the other types\n"
     "  --layout      only decode the envelope and print its field lengths\n"
-    "  OUTPUT        the text returned by the library, or - to read it from stdin\n";
+    "  OUTPUT        the text returned by the library, or - to read it from stdin\n"
+    "The wrapper is split at its last ':' when the payload is hex or base64 (RSA types, and 48/59\n"
+    "with --salt), else at its first ':', so plain-text outputs need a timestamp without ':'.\n"
+    "Exit status: 0 opened, 1 bad, foreign or other-type output, 2 bad usage or unreadable key,\n"
+    "3 password mismatch.\n";
 
-int failLine(const std::string& message, int code = 1) {
+int failLine(const std::string& message, int code = kOpenBadOutput) {
   std::fprintf(stderr, "tessel_open: %s\n", message.c_str());
   return code;
 }
@@ -71,49 +75,49 @@ int openMain(int argc, char** argv) {
     std::string v;
     if (arg == "--help" || arg == "-h") {
       std::fputs(kUsage, stdout);
-      return 0;
+      return kOpenOk;
     } else if (arg == "--type") {
-      if (!value(&v)) return failLine("--type needs a value", 2);
+      if (!value(&v)) return failLine("--type needs a value", kOpenBadUsage);
       char* end = nullptr;
       const long t = std::strtol(v.c_str(), &end, 10);
-      if (v.empty() || *end != '\0' || t < -1000000 || t > 1000000) return failLine("--type needs a number", 2);
+      if (v.empty() || *end != '\0' || t < -1000000 || t > 1000000) return failLine("--type needs a number", kOpenBadUsage);
       type = static_cast<int>(t);
     } else if (arg == "--key") {
-      if (!value(&keyPath)) return failLine("--key needs a file", 2);
+      if (!value(&keyPath)) return failLine("--key needs a file", kOpenBadUsage);
     } else if (arg == "--enc-key") {
-      if (!value(&encPath)) return failLine("--enc-key needs a file", 2);
+      if (!value(&encPath)) return failLine("--enc-key needs a file", kOpenBadUsage);
     } else if (arg == "--pin-key") {
-      if (!value(&pinKeyHex)) return failLine("--pin-key needs a value", 2);
+      if (!value(&pinKeyHex)) return failLine("--pin-key needs a value", kOpenBadUsage);
     } else if (arg == "--master-key") {
-      if (!value(&masterHex)) return failLine("--master-key needs a value", 2);
+      if (!value(&masterHex)) return failLine("--master-key needs a value", kOpenBadUsage);
     } else if (arg == "--wrapped-working-key") {
-      if (!value(&aHex)) return failLine("--wrapped-working-key needs a value", 2);
+      if (!value(&aHex)) return failLine("--wrapped-working-key needs a value", kOpenBadUsage);
     } else if (arg == "--wrapped-pin-key") {
-      if (!value(&bHex)) return failLine("--wrapped-pin-key needs a value", 2);
+      if (!value(&bHex)) return failLine("--wrapped-pin-key needs a value", kOpenBadUsage);
     } else if (arg == "--password") {
-      if (!value(&password)) return failLine("--password needs a value", 2);
+      if (!value(&password)) return failLine("--password needs a value", kOpenBadUsage);
       havePassword = true;
     } else if (arg == "--salt") {
-      if (!value(&salt)) return failLine("--salt needs a value", 2);
+      if (!value(&salt)) return failLine("--salt needs a value", kOpenBadUsage);
       haveSalt = true;
     } else if (arg == "--mode") {
-      if (!value(&v) || (v != "S" && v != "F")) return failLine("--mode is S or F", 2);
+      if (!value(&v) || (v != "S" && v != "F")) return failLine("--mode is S or F", kOpenBadUsage);
       mode = v[0];
     } else if (arg == "--layout") {
       layoutOnly = true;
     } else if (!arg.empty() && arg[0] == '-' && arg != "-") {
-      return failLine("unknown option " + arg + " (see --help)", 2);
+      return failLine("unknown option " + arg + " (see --help)", kOpenBadUsage);
     } else if (haveOutput) {
-      return failLine("more than one OUTPUT given", 2);
+      return failLine("more than one OUTPUT given", kOpenBadUsage);
     } else {
       haveOutput = true;
       output = arg;
     }
   }
-  if (!haveOutput) return failLine("no OUTPUT given (see --help)", 2);
+  if (!haveOutput) return failLine("no OUTPUT given (see --help)", kOpenBadUsage);
   if (output == "-") output.assign(std::istreambuf_iterator<char>(std::cin), std::istreambuf_iterator<char>());
   output = trimmed(output);
-  if (haveSalt && !havePassword) return failLine("--salt needs --password", 2);
+  if (haveSalt && !havePassword) return failLine("--salt needs --password", kOpenBadUsage);
 
   std::string error;
   if (layoutOnly) {
@@ -121,26 +125,34 @@ int openMain(int argc, char** argv) {
     if (!parseEnvelope(output, &layout, &error)) return failLine(error);
     std::printf("key-blob-length: %zu\nrsa-length: %zu\ncontent-length: %zu\ntotal-length: %zu\n",
                 layout.keyBlobLength, layout.rsaLength, layout.contentLength, layout.totalLength);
-    return 0;
+    return kOpenOk;
   }
 
   PrivateKey app, enc;
   OpenKeys keys;
+  const TypeLayout layout = typeLayout(type);
+  if (layout.outer == Outer::Unknown)
+    return failLine("encryption type " + std::to_string(type) + " produces no output", kOpenBadUsage);
+  if (layout.outer == Outer::DirectWithEnc ? encPath.empty() : keyPath.empty())
+    return failLine(std::string("type ") + std::to_string(type) + " needs " +
+                        (layout.outer == Outer::DirectWithEnc ? "--enc-key" : "--key") + " (see --help)",
+                    kOpenBadUsage);
   if (!keyPath.empty()) {
-    if (!app.loadPemFile(keyPath, &error)) return failLine(error);
+    if (!app.loadPemFile(keyPath, &error)) return failLine(error, kOpenBadUsage);
     keys.app = &app;
   }
   if (!encPath.empty()) {
-    if (!enc.loadPemFile(encPath, &error)) return failLine(error);
+    if (!enc.loadPemFile(encPath, &error)) return failLine(error, kOpenBadUsage);
     keys.enc = &enc;
   }
+  keys.saltedHash = haveSalt;
   if (!pinKeyHex.empty()) {
     if (pinKeyHex.size() != 32 || pinKeyHex.find_first_not_of("0123456789abcdefABCDEF") != std::string::npos)
-      return failLine("--pin-key must be 32 hex digits", 2);
+      return failLine("--pin-key must be 32 hex digits", kOpenBadUsage);
     for (std::size_t k = 0; k < 32; k += 2)
       keys.pinKey += static_cast<char>(std::stoi(pinKeyHex.substr(k, 2), nullptr, 16));
   } else if (!masterHex.empty() || !aHex.empty() || !bHex.empty()) {
-    if (!derivePinKey68(masterHex, aHex, bHex, &keys.pinKey, &error)) return failLine(error, 2);
+    if (!derivePinKey68(masterHex, aHex, bHex, &keys.pinKey, &error)) return failLine(error, kOpenBadUsage);
   }
 
   Opened opened;
@@ -152,12 +164,12 @@ int openMain(int argc, char** argv) {
     std::printf("timestamp: %s\n", opened.timestamp.c_str());
   }
   if (opened.contentOpened) std::printf("content: %s\n", printable(opened.content).c_str());
-  int status = 0;
+  int status = kOpenOk;
   if (havePassword) {
-    if (!opened.contentOpened) return failLine("the payload is sealed: give --enc-key", 2);
+    if (!opened.contentOpened) return failLine("the payload is sealed: give --enc-key", kOpenBadUsage);
     const bool match = matchesPassword(type, opened, password, salt, mode);
     std::printf("password: %s\n", match ? "match" : "mismatch");
-    if (!match) status = failLine("the password does not match", 3);
+    if (!match) status = failLine("the password does not match", kOpenPasswordMismatch);
   }
   wipeString(&opened.content);
   wipeString(&keys.pinKey);
