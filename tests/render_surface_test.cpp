@@ -227,14 +227,17 @@ std::vector<Region> regionsOf(const State& st, Keyboard& kb) {
     if (held && st.holdY < 3) out.push_back({"above the held key", fn[5], st.holdX - 0.8, 0, st.holdX + 0.8, st.holdY - 0.5});
     return out;
   }
+  // The pad's keys fill 0.95 of the width, centred: a region per column, a little inside its key.
+  const auto column = [](double c) { return 2 + (c + 0.5 - 2) * 0.953; };
   for (int n = 0; n < 10; ++n) {
-    const double x = n % 3, y = n / 3;
+    const double x = column(n % 3), y = n / 3;
     const char d = kb.charAt(kb.s->padDigits, n);
-    out.push_back({"pad position " + std::to_string(n), std::string("digit '") + d + "'", x, y, x + 1, y + 1});
+    out.push_back({"pad position " + std::to_string(n), std::string("digit '") + d + "'", x - 0.45, y, x + 0.45, y + 1});
   }
-  const double boxes[][4] = {{3, 0, 4, 1}, {3, 1, 4, 2}, {3, 2, 4, 4}, {1, 3, 2, 4}, {2, 3, 3, 4}};
+  const double boxes[][3] = {{3, 0, 1}, {3, 1, 2}, {3, 2, 4}, {1, 3, 4}, {2, 3, 4}};
   const char* names[] = {"column 3, row 0", "column 3, row 1", "done", "row 3, column 1", "row 3, column 2"};
-  for (int k = 0; k < 5; ++k) out.push_back({names[k], fn[k], boxes[k][0], boxes[k][1], boxes[k][2], boxes[k][3]});
+  for (int k = 0; k < 5; ++k)
+    out.push_back({names[k], fn[k], column(boxes[k][0]) - 0.45, boxes[k][1], column(boxes[k][0]) + 0.45, boxes[k][2]});
   return out;
 }
 
@@ -286,6 +289,10 @@ TEST(KeyPictures, EveryStateShowsTheReviewedPictureOnEveryKey) {
     if (top > 0) {  // the pop-ups: the field with its dots and cursor, and the top pop-up
       regions.push_back({"field", st.length > 0 ? std::to_string(st.length) + " dots and the cursor" : "balloon only",
                          0, -2 * kPopH / ch, cols, -kPopH / ch});
+      if (st.length > 0) {  // the cursor, one grid unit (a fortieth of the width) right of the last dot
+        const double x = cols * (0.5 + (2 * st.length - (st.setup.type ? 18 : 19)) / 40.0);
+        regions.push_back({"cursor", "the cursor", x - cols / 40, -2 * kPopH / ch, x + cols / 40, -kPopH / ch});
+      }
       regions.push_back({"top pop-up", st.holdX >= 0 ? "enlarged glyph" : "nothing", 0, -kPopH / ch, cols, 0});
     }
     for (const Region& r : regions) {
