@@ -374,7 +374,8 @@ TEST(FieldPopUp, DotsUpToTheLimitAndTheCursorAfterThem) {
     const int body = f.luma(f.w / 2, y - 50);  // the field, above the dots
     int dots = 0, run = 0, cursorX = 0, cursorN = 0;
     for (int x = 0; x < f.w; ++x) {
-      const bool dot = std::abs(f.luma(x, y) - body) > 60 && !f.cursorAt(x, y);
+      const bool inField = x > f.w * 0.035 && x < f.w * 0.965;
+      const bool dot = inField && std::abs(f.luma(x, y) - body) > 60 && !f.cursorAt(x, y);
       if (f.cursorAt(x, y)) cursorX += x, ++cursorN;
       dots += !dot && run >= 3;
       run = dot ? run + 1 : 0;

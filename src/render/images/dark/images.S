@@ -9,7 +9,7 @@
     .hidden tessel_img_background
     .type tessel_img_background, %object
 tessel_img_background:
-    .incbin "background.rgba"  // 1 x 64 x 64, fnv1a fce78e3bccd0bc03
+    .incbin "background.rgba"  // 1 x 64 x 64, fnv1a 38737039c1fc6383
     .size tessel_img_background, . - tessel_img_background
 
     .balign 16
@@ -17,7 +17,7 @@ tessel_img_background:
     .hidden tessel_img_field_frame
     .type tessel_img_field_frame, %object
 tessel_img_field_frame:
-    .incbin "field_frame.rgba"  // 1 x 64 x 64, fnv1a 68ec29a5650e6403
+    .incbin "field_frame.rgba"  // 1 x 64 x 64, fnv1a fec47175bf442f03
     .size tessel_img_field_frame, . - tessel_img_field_frame
 
     .balign 16
@@ -81,7 +81,7 @@ tessel_img_glyphs_pad_digits:
     .hidden tessel_img_key_char
     .type tessel_img_key_char, %object
 tessel_img_key_char:
-    .incbin "key_char.rgba"  // 1 x 128 x 256, fnv1a 784cc7043fad5bcf
+    .incbin "key_char.rgba"  // 1 x 128 x 256, fnv1a d98c38654d731973
     .size tessel_img_key_char, . - tessel_img_key_char
 
     .balign 16
@@ -89,7 +89,7 @@ tessel_img_key_char:
     .hidden tessel_img_key_char_held
     .type tessel_img_key_char_held, %object
 tessel_img_key_char_held:
-    .incbin "key_char_held.rgba"  // 1 x 128 x 256, fnv1a 02437fc7fab8e70f
+    .incbin "key_char_held.rgba"  // 1 x 128 x 256, fnv1a e95427a2d8936f83
     .size tessel_img_key_char_held, . - tessel_img_key_char_held
 
     .balign 16
@@ -97,7 +97,7 @@ tessel_img_key_char_held:
     .hidden tessel_img_key_balloon
     .type tessel_img_key_balloon, %object
 tessel_img_key_balloon:
-    .incbin "key_balloon.rgba"  // 1 x 128 x 256, fnv1a cf30e55ea6aadd93
+    .incbin "key_balloon.rgba"  // 1 x 128 x 256, fnv1a a1f9810a945e9f0f
     .size tessel_img_key_balloon, . - tessel_img_key_balloon
 
     .balign 16
@@ -105,7 +105,7 @@ tessel_img_key_balloon:
     .hidden tessel_img_key_space
     .type tessel_img_key_space, %object
 tessel_img_key_space:
-    .incbin "key_space.rgba"  // 1 x 512 x 256, fnv1a c30daa1ed8205aef
+    .incbin "key_space.rgba"  // 1 x 512 x 256, fnv1a d494df2ab9c548ef
     .size tessel_img_key_space, . - tessel_img_key_space
 
     .balign 16
@@ -113,7 +113,7 @@ tessel_img_key_space:
     .hidden tessel_img_key_space_held
     .type tessel_img_key_space_held, %object
 tessel_img_key_space_held:
-    .incbin "key_space_held.rgba"  // 1 x 512 x 256, fnv1a 6bd576978c77fcfb
+    .incbin "key_space_held.rgba"  // 1 x 512 x 256, fnv1a 6b0638abb575b0ff
     .size tessel_img_key_space_held, . - tessel_img_key_space_held
 
     .balign 16
@@ -121,7 +121,7 @@ tessel_img_key_space_held:
     .hidden tessel_img_label_space
     .type tessel_img_label_space, %object
 tessel_img_label_space:
-    .incbin "label_space.rgba"  // 1 x 256 x 128, fnv1a 5e1f019d36912ad5
+    .incbin "label_space.rgba"  // 1 x 256 x 128, fnv1a c272a70959f10189
     .size tessel_img_label_space, . - tessel_img_label_space
 
     .balign 16
@@ -129,7 +129,7 @@ tessel_img_label_space:
     .hidden tessel_img_key_shift_delete
     .type tessel_img_key_shift_delete, %object
 tessel_img_key_shift_delete:
-    .incbin "key_shift_delete.rgba"  // 1 x 128 x 256, fnv1a 2e19f6db1f56020b
+    .incbin "key_shift_delete.rgba"  // 1 x 128 x 256, fnv1a c2c639f411817a37
     .size tessel_img_key_shift_delete, . - tessel_img_key_shift_delete
 
     .balign 16
@@ -137,7 +137,7 @@ tessel_img_key_shift_delete:
     .hidden tessel_img_key_shift_delete_held
     .type tessel_img_key_shift_delete_held, %object
 tessel_img_key_shift_delete_held:
-    .incbin "key_shift_delete_held.rgba"  // 1 x 128 x 256, fnv1a 7bf17dbffb9644df
+    .incbin "key_shift_delete_held.rgba"  // 1 x 128 x 256, fnv1a bb99cee94b4f18b7
     .size tessel_img_key_shift_delete_held, . - tessel_img_key_shift_delete_held
 
     .balign 16
@@ -145,7 +145,7 @@ tessel_img_key_shift_delete_held:
     .hidden tessel_img_key_switch
     .type tessel_img_key_switch, %object
 tessel_img_key_switch:
-    .incbin "key_switch.rgba"  // 1 x 256 x 256, fnv1a 8bd523088ed6b71d
+    .incbin "key_switch.rgba"  // 1 x 256 x 256, fnv1a 0356a65ef2465a8f
     .size tessel_img_key_switch, . - tessel_img_key_switch
 
     .balign 16
@@ -153,7 +153,7 @@ tessel_img_key_switch:
     .hidden tessel_img_key_switch_held
     .type tessel_img_key_switch_held, %object
 tessel_img_key_switch_held:
-    .incbin "key_switch_held.rgba"  // 1 x 256 x 256, fnv1a e444ba8c95ab19e7
+    .incbin "key_switch_held.rgba"  // 1 x 256 x 256, fnv1a 0048bb5b01909f13
     .size tessel_img_key_switch_held, . - tessel_img_key_switch_held
 
     .balign 16
@@ -161,7 +161,7 @@ tessel_img_key_switch_held:
     .hidden tessel_img_key_done
     .type tessel_img_key_done, %object
 tessel_img_key_done:
-    .incbin "key_done.rgba"  // 1 x 128 x 128, fnv1a ff027da6ba6db1ed
+    .incbin "key_done.rgba"  // 1 x 128 x 128, fnv1a d95e24d548bda4fc
     .size tessel_img_key_done, . - tessel_img_key_done
 
     .balign 16
@@ -241,7 +241,7 @@ tessel_img_label_to_pad:
     .hidden tessel_img_key_pad
     .type tessel_img_key_pad, %object
 tessel_img_key_pad:
-    .incbin "key_pad.rgba"  // 1 x 256 x 128, fnv1a 040e2b8fdae9dc4b
+    .incbin "key_pad.rgba"  // 1 x 256 x 128, fnv1a 5a07ccdcc0810857
     .size tessel_img_key_pad, . - tessel_img_key_pad
 
     .balign 16
@@ -249,7 +249,7 @@ tessel_img_key_pad:
     .hidden tessel_img_key_pad_alt
     .type tessel_img_key_pad_alt, %object
 tessel_img_key_pad_alt:
-    .incbin "key_pad_alt.rgba"  // 1 x 256 x 128, fnv1a 5e387b4b80dd417f
+    .incbin "key_pad_alt.rgba"  // 1 x 256 x 128, fnv1a 6aa84285933db673
     .size tessel_img_key_pad_alt, . - tessel_img_key_pad_alt
 
     .balign 16
@@ -257,7 +257,7 @@ tessel_img_key_pad_alt:
     .hidden tessel_img_key_pad_done
     .type tessel_img_key_pad_done, %object
 tessel_img_key_pad_done:
-    .incbin "key_pad_done.rgba"  // 1 x 128 x 128, fnv1a 52ce948099cd9813
+    .incbin "key_pad_done.rgba"  // 1 x 128 x 128, fnv1a 6002cdfd564bd073
     .size tessel_img_key_pad_done, . - tessel_img_key_pad_done
 
     .balign 16
@@ -265,7 +265,7 @@ tessel_img_key_pad_done:
     .hidden tessel_img_key_pad_done_held
     .type tessel_img_key_pad_done_held, %object
 tessel_img_key_pad_done_held:
-    .incbin "key_pad_done_held.rgba"  // 1 x 256 x 256, fnv1a c453fd00010935df
+    .incbin "key_pad_done_held.rgba"  // 1 x 256 x 256, fnv1a fc8eaa827963b73b
     .size tessel_img_key_pad_done_held, . - tessel_img_key_pad_done_held
 
     .balign 16
