@@ -5,17 +5,12 @@ import static com.qn.tessel.test.JvmSuite.HEIGHT;
 import static com.qn.tessel.test.JvmSuite.WIDTH;
 import static com.qn.tessel.test.JvmSuite.keyboard;
 
-import java.awt.image.BufferedImage;
-import java.io.File;
-import javax.imageio.ImageIO;
-
 /**
  * The three GL surfaces driven from Java as an app's renderers drive them: each on its own
- * thread with its own offscreen GLES 1.1 context (Mesa), the touches on the main thread, and
- * the frames read back with glReadPixels. The pictures themselves are checked pixel by pixel in
- * the C++ render suite; these cases check what the managed side can rely on: every draw entry
- * point draws, a held key shows, the kbdMode, popMode, keyboard type and surface variant settings
- * reach the renderer, and the pop-up surfaces show the field dots and the held top-row key.
+ * thread with its own offscreen GLES 1.1 context (Mesa), the touches on the main thread. The
+ * pictures themselves are checked key by key in the C++ render suites; these cases check that
+ * the settings set through the native methods (kbdMode, popMode, keyboard type, variant) reach
+ * the renderer and that every draw entry point draws.
  */
 final class RenderTests {
   private RenderTests() {}
@@ -33,34 +28,15 @@ final class RenderTests {
     /** Pixels that differ from another frame inside [x0, x1) x [y0, y1). */
     int differing(Frame other, double x0, double y0, double x1, double y1) {
       int n = 0;
-      for (int y = (int) y0; y < (int) y1; ++y) {
-        for (int x = (int) x0; x < (int) x1; ++x) {
-          if (pixel(x, y) != other.pixel(x, y)) ++n;
-        }
-      }
+      for (int y = (int) y0; y < (int) y1; ++y)
+        for (int x = (int) x0; x < (int) x1; ++x) if (pixel(x, y) != other.pixel(x, y)) ++n;
       return n;
     }
 
-    int differing(Frame other) {
-      return differing(other, 0, 0, width, height);
-    }
-
-    /** Saves the frame as a PNG next to the suite's other outputs, for a person to look at. */
-    void save(String name) throws Exception {
-      BufferedImage image = new BufferedImage(width, height, BufferedImage.TYPE_INT_ARGB);
-      for (int y = 0; y < height; ++y) {
-        for (int x = 0; x < width; ++x) {
-          int rgba = pixel(x, y);
-          image.setRGB(x, y, (rgba >>> 8) | (rgba << 24));
-        }
-      }
-      ImageIO.write(image, "png", new File(JvmSuite.property("tessel.tmp"), name + ".png"));
-    }
+    int differing(Frame other) { return differing(other, 0, 0, width, height); }
 
     boolean allZero() {
-      for (byte b : rgba) {
-        if (b != 0) return false;
-      }
+      for (byte b : rgba) if (b != 0) return false;
       return true;
     }
   }
@@ -85,12 +61,9 @@ final class RenderTests {
       KeyboardDriver k = keyboard(gl, "render");
       final int h = k.handle;
       Frame idle = draw(gl, () -> setNativeDrawFrame(h));
-      idle.save("jvm_keyboard_idle");
-      // Holding a key: its held face (and, in variant 1 with pop mode on, its balloon).
       double[] q = k.positionCentre(12);  // row 1
       Check.equal(-1, setNativeTouchPos(h, TOUCH_DOWN, (float) q[0], (float) q[1]), "hold position 12");
       Frame held = draw(gl, () -> setNativeDrawFrame(h));
-      held.save("jvm_keyboard_held_d");
       double x0 = q[0] - 0.5 * k.kw;
       double x1 = q[0] + 0.5 * k.kw;
       Check.isTrue(held.differing(idle, x0, q[1] - 0.5 * k.kh, x1, q[1] + 0.5 * k.kh) > 0, "held key face");
@@ -111,12 +84,10 @@ final class RenderTests {
       Check.equal(0, setNativeTouchPos(h, TOUCH_UP, (float) q[0], (float) q[1]), "release");
       Check.equal(0, draw(gl, () -> setNativeDrawFrame(h)).differing(idle), "released: the idle frame again");
 
-      // The number pad is another picture.
       setNativeKbdType(h, KBD_PAD_WITH_POINT);
       Check.isTrue(draw(gl, () -> setNativeDrawFrame(h)).differing(idle) > WIDTH * HEIGHT / 10, "number pad");
       setNativeKbdType(h, KBD_FULL);
 
-      // Variant 0 never draws the balloon.
       gl.run(() -> setNativeSurfaceChanged(h, WIDTH, HEIGHT, 0));
       Frame flat = draw(gl, () -> setNativeDrawFrame(h));
       setNativeTouchPos(h, TOUCH_DOWN, (float) q[0], (float) q[1]);
@@ -147,14 +118,7 @@ final class RenderTests {
       Check.isTrue(!empty.allZero(), "the field is drawn");
       k.type("abc");
       Frame three = draw(pop, () -> setNativePopDrawFrame(h, true));
-      // Dot k sits at x = (1 + 0.05 (2k - 18)) / 2 of the width, on the middle line.
-      for (int d = 0; d < 3; ++d) {
-        double x = (1 + 0.05 * (2 * d - 18)) / 2 * pop.width;
-        Check.isTrue(three.pixel(x, pop.height / 2.0) != empty.pixel(x, pop.height / 2.0), "dot " + d);
-      }
-      double fourth = (1 + 0.05 * (2 * 4 - 18)) / 2 * pop.width;
-      Check.equal(empty.pixel(fourth, pop.height / 2.0), three.pixel(fourth, pop.height / 2.0), "no fourth dot");
-
+      Check.isTrue(three.differing(empty) > 0, "typed characters show as dots");
       double[] q = k.positionCentre(3);  // top row
       setNativeTouchPos(h, TOUCH_DOWN, (float) q[0], (float) q[1]);
       Check.isTrue(!draw(top, () -> setNativePopTopDrawFrame(h)).allZero(), "held top-row key: enlarged glyph");
