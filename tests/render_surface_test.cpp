@@ -197,6 +197,8 @@ const State kStates[] = {
     {"popups_letters", {}, 2.5, 0.5, "shift off|delete|?123|space|Done|no balloon", 7},
     {"popups_symbols_page2", {1080, 720, 1, 0, 1, 1}, 6.5, 0.5, "#+=|delete|ABC|space|Done|no balloon", 0},
     {"popups_pad", {1080, 720, 1, 1}, -1, -1, "delete|Clear|Done and chevron|'.'|OK", 5},
+    {"popups_letters_25_typed", {}, -1, -1, "shift off|delete|?123|space|Done|no balloon", 25},
+    {"popups_pad_25_typed", {1080, 720, 1, 2}, -1, -1, "delete|Clear|Done|space label|space label", 25},
 };
 
 std::vector<std::string> split(const std::string& s) {
@@ -287,10 +289,11 @@ TEST(KeyPictures, EveryStateShowsTheReviewedPictureOnEveryKey) {
     std::vector<Region> regions = regionsOf(st, kb);
     const double cols = st.setup.type == 0 ? 10 : 4, cw = kb.w / cols, ch = kb.h / 4.0;
     if (top > 0) {  // the pop-ups: the field with its dots and cursor, and the top pop-up
-      regions.push_back({"field", st.length > 0 ? std::to_string(st.length) + " dots and the cursor" : "balloon only",
+      regions.push_back({"field", st.length > 0 ? std::to_string(std::min(st.length, st.setup.type ? 18 : 19)) + " dots" : "balloon only",
                          0, -2 * kPopH / ch, cols, -kPopH / ch});
       if (st.length > 0) {  // the cursor, one grid unit (a fortieth of the width) right of the last dot
-        const double x = cols * (0.5 + (2 * st.length - (st.setup.type ? 18 : 19)) / 40.0);
+        const int dots = std::min(st.length, st.setup.type ? 18 : 19);
+        const double x = cols * (0.5 + (2 * dots - (st.setup.type ? 18 : 19)) / 40.0);
         regions.push_back({"cursor", "the cursor", x - cols / 40, -2 * kPopH / ch, x + cols / 40, -kPopH / ch});
       }
       regions.push_back({"top pop-up", st.holdX >= 0 ? "enlarged glyph" : "nothing", 0, -kPopH / ch, cols, 0});
@@ -355,38 +358,7 @@ TEST(KeyPictures, ShuffledLayoutShowsEachCharacterOnItsKey) {
   }
 }
 
-// ---- the field pop-up: dots, the cursor's place and its blink
-
-TEST(FieldPopUp, DotsUpToTheLimitAndTheCursorAfterThem) {
-  struct Case {
-    std::uint32_t type;
-    int length, dots;
-  } cases[] = {{0, 0, 0}, {0, 1, 1}, {0, 19, 19}, {0, 25, 19}, {1, 4, 4}, {1, 18, 18}, {2, 25, 18}};
-  Keyboard kb("render-dots", {});
-  REQUIRE_GL(kb);
-  PopUps pops(kb);
-  for (const Case& c : cases) {
-    SCOPED_TRACE("type " + std::to_string(c.type) + ", length " + std::to_string(c.length));
-    kb.s->currentKbdType = c.type;
-    kb.setLength(c.length);
-    const Shot f = pops.fieldWithCursor();
-    const int y = kPopH / 2 + (c.type ? 8 : 0);
-    const int body = f.luma(f.w / 2, y - 50);  // the field, above the dots
-    int dots = 0, run = 0, cursorX = 0, cursorN = 0;
-    for (int x = 0; x < f.w; ++x) {
-      const bool inField = x > f.w * 0.035 && x < f.w * 0.965;
-      const bool dot = inField && std::abs(f.luma(x, y) - body) > 60 && !f.cursorAt(x, y);
-      if (f.cursorAt(x, y)) cursorX += x, ++cursorN;
-      dots += !dot && run >= 3;
-      run = dot ? run + 1 : 0;
-    }
-    EXPECT_EQ(dots, c.dots);
-    ASSERT_GT(cursorN, 0) << "no cursor";
-    // One grid unit (a twentieth of the width) right of the last dot.
-    const double expected = f.w / 2.0 + (2 * c.dots - (c.type ? 18 : 19)) * f.w / 40.0;
-    EXPECT_NEAR(cursorX / static_cast<double>(cursorN), expected, 2.0);
-  }
-}
+// ---- the cursor's blink
 
 // The phase flips on the first frame more than 800 ms after the last flip, measured within the
 // second, and only then.
