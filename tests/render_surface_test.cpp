@@ -1,12 +1,8 @@
-// The three surfaces drawn by Mesa's GLES 1.1 (llvmpipe, offscreen) and read back: what a user
-// sees. Every keyboard state is compared, key region by key region, with a reviewed picture of
-// it (docs/screenshots/<theme>/<state>.png, the same files the README shows), so a key showing
-// the wrong picture, or its picture moved or resized, fails naming the key and the picture it
-// should show. Glyph positions under a shuffled layout are recognised against the embedded
-// glyphs instead, and the cursor blink runs on a test clock.
-//
-// TESSEL_UPDATE_SCREENSHOTS=1 rewrites the reviewed pictures instead of comparing: look at every
-// changed one before committing it.
+// The three surfaces drawn by Mesa's GLES 1.1 (llvmpipe, offscreen) and read back. Every keyboard
+// state is compared key region by key region with its reviewed picture (docs/screenshots/<theme>/,
+// shown by the README): a wrong, moved or resized picture fails naming the key and what it should
+// show. Shuffled glyphs are recognised against the embedded ones; the cursor blinks on a test clock.
+// TESSEL_UPDATE_SCREENSHOTS=1 rewrites the pictures instead: review each change before committing.
 #include <gtest/gtest.h>
 
 #include <GLES/gl.h>
@@ -14,6 +10,7 @@
 #include <algorithm>
 #include <cmath>
 #include <cstdlib>
+#include <memory>
 #include <sstream>
 #include <string>
 #include <vector>
@@ -44,10 +41,7 @@ struct Shot {
   bool cursorAt(int x, int y) const { return at(x, y)[2] > at(x, y)[0] + 80; }  // blue in both themes
 };
 
-Shot grab(const GlesContext& gl) {
-  glFinish();
-  return {gl.width(), gl.height(), gl.readRgba()};
-}
+Shot grab(const GlesContext& gl) { return glFinish(), Shot{gl.width(), gl.height(), gl.readRgba()}; }
 
 // Several surfaces one above the other, as the app stacks its views.
 Shot stack(const std::vector<Shot>& shots) {
@@ -74,9 +68,7 @@ class Keyboard {
     handle = createSession(name.c_str());
     s = sessionAt(handle);
     if (s == nullptr || !gl.ok()) return;
-    s->kbdRandom = o.shuffled ? 1 : 0;
-    s->maxLength = 4092;
-    s->finishMode = 1;
+    s->kbdRandom = o.shuffled ? 1 : 0, s->maxLength = 4092, s->finishMode = 1;
     mainSurfaceCreated(*s);
     mainSurfaceChanged(*s, o.w, o.h, o.mode);
     s->currentKbdType = o.type, s->symbolPage = o.page, s->shiftOn = o.shift;
@@ -84,11 +76,7 @@ class Keyboard {
   }
   ~Keyboard() { destroySession(handle); }
   bool ready() const { return s != nullptr && gl.ok(); }
-  Shot draw() {
-    gl.makeCurrent();
-    mainDrawFrame(*s);
-    return grab(gl);
-  }
+  Shot draw() { return gl.makeCurrent(), mainDrawFrame(*s), grab(gl); }
   // Holds the key whose cell (in key widths and heights) is centred at (cx, cy).
   void hold(double cx, double cy) {
     const double cols = s->currentKbdType == 0 ? 10 : 4;
@@ -96,9 +84,7 @@ class Keyboard {
   }
   void setLength(int n) {
     ContentGuard guard(*s->content);
-    for (int k = 0; k < n; ++k) guard.text()[k] = 'x';
-    guard.text()[n] = 0;
-    s->content->length = static_cast<std::uint16_t>(n);
+    std::fill_n(guard.text(), n, 'x'), guard.text()[n] = 0, s->content->length = static_cast<std::uint16_t>(n);
   }
   char charAt(const RelaxedField<std::uint8_t>* table, int i) const {
     return static_cast<char>(static_cast<std::uint8_t>(table[i] + s->keyMask));
@@ -115,23 +101,11 @@ class Keyboard {
 class PopUps {
  public:
   explicit PopUps(Keyboard& kb) : field(kb.w, kPopH), top(kb.w, kPopH), kb_(kb) {
-    field.makeCurrent();
-    popSurfaceCreated(*kb.s);
-    popSurfaceChanged(*kb.s, kb.w, kPopH);
-    top.makeCurrent();
-    popTopSurfaceCreated(*kb.s);
-    popTopSurfaceChanged(*kb.s, kb.w, kPopH);
+    field.makeCurrent(), popSurfaceCreated(*kb.s), popSurfaceChanged(*kb.s, kb.w, kPopH);
+    top.makeCurrent(), popTopSurfaceCreated(*kb.s), popTopSurfaceChanged(*kb.s, kb.w, kPopH);
   }
-  Shot drawField(bool showField = true) {
-    field.makeCurrent();
-    popDrawFrame(*kb_.s, showField);
-    return grab(field);
-  }
-  Shot drawTop() {
-    top.makeCurrent();
-    popTopDrawFrame(*kb_.s);
-    return grab(top);
-  }
+  Shot drawField(bool showField = true) { return field.makeCurrent(), popDrawFrame(*kb_.s, showField), grab(field); }
+  Shot drawTop() { return top.makeCurrent(), popTopDrawFrame(*kb_.s), grab(top); }
   bool cursorShown(const Shot& f) const {
     for (int x = 0; x < f.w; ++x)
       if (f.cursorAt(x, kPopH / 2 + (kb_.s->currentKbdType ? 8 : 0))) return true;
@@ -201,17 +175,12 @@ const State kStates[] = {
     {"popups_pad_25_typed", {1080, 720, 1, 2}, -1, -1, "delete|Clear|Done|space label|space label", 25},
 };
 
-std::vector<std::string> split(const std::string& s) {
-  std::vector<std::string> out;
-  std::stringstream in(s);
-  for (std::string part; std::getline(in, part, '|');) out.push_back(part);
-  return out;
-}
-
 // The regions of a state's keyboard, named by key and by the picture each should show.
 std::vector<Region> regionsOf(const State& st, Keyboard& kb) {
   std::vector<Region> out;
-  const std::vector<std::string> fn = split(st.functionKeys);
+  std::vector<std::string> fn;
+  std::stringstream in(st.functionKeys);
+  for (std::string part; std::getline(in, part, '|');) fn.push_back(part);
   const bool held = st.holdX >= 0;
   if (st.setup.type == 0) {
     const bool symbols = st.setup.page != 0;
@@ -252,11 +221,8 @@ int differing(const Shot& a, const Shot& b, int x0, int y0, int x1, int y1) {
   int n = 0;
   for (int y = std::max(0, y0); y < std::min(a.h, y1); ++y)
     for (int x = std::max(0, x0); x < std::min(a.w, x1); ++x)
-      for (int c = 0; c < 4; ++c)
-        if (std::abs(a.at(x, y)[c] - b.at(x, y)[c]) > 40) {
-          ++n;
-          break;
-        }
+      n += std::max({std::abs(a.at(x, y)[0] - b.at(x, y)[0]), std::abs(a.at(x, y)[1] - b.at(x, y)[1]),
+                     std::abs(a.at(x, y)[2] - b.at(x, y)[2]), std::abs(a.at(x, y)[3] - b.at(x, y)[3])}) > 40;
   return n;
 }
 
@@ -267,22 +233,16 @@ TEST(KeyPictures, EveryStateShowsTheReviewedPictureOnEveryKey) {
     Keyboard kb(std::string("render-") + st.name, st.setup);
     REQUIRE_GL(kb);
     std::vector<Shot> shots;
-    if (st.length >= 0) {
-      PopUps pops(kb);
+    std::unique_ptr<PopUps> pops(st.length >= 0 ? new PopUps(kb) : nullptr);
+    if (st.holdX >= 0) kb.hold(st.holdX, st.holdY);
+    if (pops) {
       kb.setLength(st.length);
-      if (st.holdX >= 0) kb.hold(st.holdX, st.holdY);
-      shots.push_back(st.length > 0 ? pops.fieldWithCursor() : pops.drawField(false));
-      shots.push_back(pops.drawTop());
-    } else if (st.holdX >= 0) {
-      kb.hold(st.holdX, st.holdY);
+      shots = {st.length > 0 ? pops->fieldWithCursor() : pops->drawField(false), pops->drawTop()};
     }
     shots.push_back(kb.draw());
     const Shot shot = stack(shots);
     const int top = shot.h - kb.h;  // the keyboard's first row in the stacked picture
-    if (update) {
-      EXPECT_TRUE(test::writePng(referencePath(st.name), shot.w, shot.h, shot.px));
-      continue;
-    }
+    if (update && test::writePng(referencePath(st.name), shot.w, shot.h, shot.px)) continue;
     Shot ref;
     ASSERT_TRUE(test::readPng(referencePath(st.name), ref.w, ref.h, ref.px)) << "no reviewed " << referencePath(st.name);
     ASSERT_EQ(ref.w * 10000 + ref.h, shot.w * 10000 + shot.h) << "size of the reviewed picture";
@@ -333,18 +293,14 @@ int recognise(const Shot& shot, const ImageGroup& group, double cx, double cy, d
 
 TEST(KeyPictures, ShuffledLayoutShowsEachCharacterOnItsKey) {
   struct Case {
-    std::uint32_t page, shift;
-    int mode;
+    std::uint32_t page, shift, mode;
     const ImageGroup& group;
-  } cases[] = {{0, 0, 1, images::kLetterGlyphs},      {0, 1, 1, images::kShiftedLetterGlyphs},
-               {1, 0, 1, images::kSymbolGlyphs},      {1, 1, 1, images::kSymbolShiftGlyphs},
-               {0, 0, 0, images::kLetterGlyphs},      {1, 1, 0, images::kSymbolShiftGlyphs}};
+  } cases[] = {{0, 0, 1, images::kLetterGlyphs}, {0, 1, 1, images::kShiftedLetterGlyphs}, {1, 0, 1, images::kSymbolGlyphs},
+               {1, 1, 1, images::kSymbolShiftGlyphs}, {0, 0, 0, images::kLetterGlyphs}, {1, 1, 0, images::kSymbolShiftGlyphs}};
   const bool darkInk = std::string(TESSEL_TEST_THEME) != "dark";
   for (const Case& c : cases) {
     SCOPED_TRACE("page " + std::to_string(c.page) + ", shift " + std::to_string(c.shift) + ", mode " + std::to_string(c.mode));
-    Scene setup;
-    setup.mode = c.mode, setup.page = c.page, setup.shift = c.shift, setup.shuffled = true;
-    Keyboard kb("render-shuffled", setup);
+    Keyboard kb("render-shuffled", {1080, 720, static_cast<int>(c.mode), 0, c.page, c.shift, 0, 0, 1, true});
     REQUIRE_GL(kb);
     const Shot shot = kb.draw();
     const auto* table = c.page == 0 ? kb.s->letters : (c.shift ? kb.s->symbolsUpper : kb.s->symbolsLower);
@@ -394,14 +350,10 @@ TEST(OddState, UnbuiltUnsizedAndOutOfRangeStatesAreHarmless) {
   ASSERT_NE(s, nullptr);
   GlesContext pop(64, 64);
   ASSERT_TRUE(pop.ok()) << pop.error();
-  popSurfaceCreated(*s);
-  popSurfaceChanged(*s, 64, 64);
-  glClearColor(1, 0, 0, 1);
-  glClear(GL_COLOR_BUFFER_BIT);
-  popDrawFrame(*s, true);  // not built yet: nothing drawn
-  popTopDrawFrame(*s);
-  EXPECT_EQ(grab(pop).at(32, 32)[0], 255);
-  EXPECT_EQ(grab(pop).at(32, 32)[1], 0);
+  popSurfaceCreated(*s), popSurfaceChanged(*s, 64, 64);
+  glClearColor(1, 0, 0, 1), glClear(GL_COLOR_BUFFER_BIT);
+  popDrawFrame(*s, true), popTopDrawFrame(*s);  // not built yet: nothing drawn
+  EXPECT_TRUE(grab(pop).at(32, 32)[0] == 255 && grab(pop).at(32, 32)[1] == 0);
   destroySession(handle);
 
   Keyboard kb("render-odd", {});
@@ -412,10 +364,7 @@ TEST(OddState, UnbuiltUnsizedAndOutOfRangeStatesAreHarmless) {
       for (std::uint32_t column : {8u, 26u, 0xFFFFFFFFu}) {
         kb.s->currentKbdType = type;
         kb.s->anyKeyReleased = 0, kb.s->keyReleased[3] = 0, kb.s->touchRow = row, kb.s->touchColumn = column;
-        kb.draw();
-        if (type != 0) continue;
-        pops.drawField();
-        pops.drawTop();
+        kb.draw(), pops.drawField(), pops.drawTop();
       }
   kb.gl.makeCurrent();
   EXPECT_EQ(glGetError(), static_cast<GLenum>(GL_NO_ERROR));

@@ -11,10 +11,8 @@ bool writePng(const std::string& path, int width, int height, const std::vector<
 #if defined(TESSEL_HAVE_PNG)
   if (width <= 0 || height <= 0 || rgba.size() < static_cast<std::size_t>(width) * height * 4) return false;
   png_image image{};
-  image.version = PNG_IMAGE_VERSION;
-  image.width = static_cast<png_uint_32>(width);
-  image.height = static_cast<png_uint_32>(height);
-  image.format = PNG_FORMAT_RGBA;
+  image.version = PNG_IMAGE_VERSION, image.format = PNG_FORMAT_RGBA;
+  image.width = static_cast<png_uint_32>(width), image.height = static_cast<png_uint_32>(height);
   return png_image_write_to_file(&image, path.c_str(), 0, rgba.data(), 0, nullptr) != 0;
 #else
   (void)path, (void)width, (void)height, (void)rgba;

@@ -204,8 +204,8 @@ Canvas padDoneFace(int size, const KeyLook& look) {
   return c;
 }
 
-// The key balloon: drawn over a held key, its stem is exactly that key's face and its head
-// holds the enlarged glyph one key height higher. Full image 128 x 256 shown at about
+// The key balloon: drawn over a held key, its head holds the enlarged glyph one key height
+// higher and a short neck joins it to the key. Full image 128 x 256 shown at about
 // 254 x 503 around a point 0.04 key heights above the key's top edge.
 Canvas balloon() {
   const float halfW = (1 / kAspect) * 1.05f * 0.895f * 1.5f * kUx;
@@ -217,8 +217,11 @@ Canvas balloon() {
   const float glyphCy = cy - (kUy - 0.1f * kUy - 0.08f * kUy);
   const float headHalfW = 76.0f, headTop = glyphCy - 74.0f, headBottom = glyphCy + 80.0f;
   const Sdf head = roundRect(cx - headHalfW, headTop, cx + headHalfW, headBottom, 24.0f);
-  const Sdf stem = roundRect(cx - faceHalfW + 1.5f, headBottom - 40.0f, cx + faceHalfW - 1.5f,
-                             keyCy + faceHalfH - 3.0f, kKeyRadius);
+  // A neck down to just inside the held key's top edge, well narrower than the key: the balloon
+  // is scaled by key height, so a stem as wide as the face at the reference aspect came out
+  // narrower than wider keys (tablets, landscape); the held face itself stays visible below.
+  const float neckHalfW = 0.55f * faceHalfW, keyTop = keyCy - faceHalfH;
+  const Sdf stem = roundRect(cx - neckHalfW, headBottom - 40.0f, cx + neckHalfW, keyTop + 14.0f, 10.0f);
   const Sdf shape = smoothUnite(head, stem, 18.0f);
   c.fill(shift(shape, 0, 1.0f), Color{kKeyShadow.r, kKeyShadow.g, kKeyShadow.b, 0.22f}, 7.0f);
   c.fill(shift(shape, 0, 2.0f), kKeyShadow);

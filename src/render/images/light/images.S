@@ -97,7 +97,7 @@ tessel_img_key_char_held:
     .hidden tessel_img_key_balloon
     .type tessel_img_key_balloon, %object
 tessel_img_key_balloon:
-    .incbin "key_balloon.rgba"  // 1 x 128 x 256, fnv1a 3391807b5da1c773
+    .incbin "key_balloon.rgba"  // 1 x 128 x 256, fnv1a d24c90bac5b66e97
     .size tessel_img_key_balloon, . - tessel_img_key_balloon
 
     .balign 16
