@@ -25,6 +25,13 @@ namespace tessel {
 using render::S;
 using render::T;
 
+// The wall clock's microseconds within the second; a hook so that tests can drive the blink.
+std::int32_t (*cursorClockMicros)() = [] {
+  timeval now{};
+  gettimeofday(&now, nullptr);
+  return static_cast<std::int32_t>(now.tv_usec);
+};
+
 namespace {
 
 struct CursorBlink {
@@ -35,9 +42,7 @@ CursorBlink gBlink;
 
 // True when the cursor is to be drawn; flips the phase once 800 ms have passed.
 bool cursorVisible() {
-  timeval now{};
-  gettimeofday(&now, nullptr);
-  const auto u = static_cast<std::int32_t>(now.tv_usec);
+  const std::int32_t u = cursorClockMicros();
   const std::int32_t last = gBlink.lastToggle;
   const std::int32_t elapsed = u > last ? u - last : u + 1000000 - last;
   if (elapsed < 800001) return gBlink.phase == 1;

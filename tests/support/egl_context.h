@@ -1,15 +1,7 @@
-// An offscreen OpenGL ES 1.1 context for tests and benchmarks: Mesa's surfaceless EGL platform
-// (EGL_PLATFORM_SURFACELESS_MESA through eglGetPlatformDisplayEXT) with a pbuffer surface, so
-// the library's GL calls run on a real driver (llvmpipe) without a window system.
-//
-// Header-only, so benchmark programs (which do not link the test-support library) can use it
-// too. One EGLDisplay is opened per process and kept; each GlesContext owns its own context
-// and pbuffer, like each of the app's GL surfaces. Texture names are per context.
-//
-//   tessel::test::GlesContext gl(1080, 720);
-//   ASSERT_TRUE(gl.ok()) << gl.error();
-//   ... draw ...
-//   std::vector<std::uint8_t> rgba = gl.readRgba();   // top row first
+// An offscreen OpenGL ES 1.1 context for tests and benchmarks (header-only): Mesa's surfaceless
+// EGL platform with a pbuffer surface, so the library's GL calls run on a real driver
+// (llvmpipe) without a window system. One EGLDisplay per process; each GlesContext owns its
+// context and pbuffer, like each of the app's GL surfaces (texture names are per context).
 #pragma once
 
 #include <EGL/egl.h>
@@ -28,29 +20,20 @@ class GlesContext {
   GlesContext(int width, int height) : width_(width), height_(height) {
     display_ = sharedDisplay(error_);
     if (display_ == EGL_NO_DISPLAY) return;
-    const EGLint configAttributes[] = {EGL_SURFACE_TYPE,    EGL_PBUFFER_BIT, EGL_RENDERABLE_TYPE, EGL_OPENGL_ES_BIT,
-                                       EGL_RED_SIZE,        8,               EGL_GREEN_SIZE,      8,
-                                       EGL_BLUE_SIZE,       8,               EGL_ALPHA_SIZE,      8,
-                                       EGL_DEPTH_SIZE,      16,              EGL_NONE};
+    const EGLint configAttributes[] = {EGL_SURFACE_TYPE, EGL_PBUFFER_BIT, EGL_RENDERABLE_TYPE, EGL_OPENGL_ES_BIT,
+                                       EGL_RED_SIZE, 8, EGL_GREEN_SIZE, 8, EGL_BLUE_SIZE, 8, EGL_ALPHA_SIZE, 8,
+                                       EGL_DEPTH_SIZE, 16, EGL_NONE};
     EGLConfig config = nullptr;
     EGLint count = 0;
-    if (!eglChooseConfig(display_, configAttributes, &config, 1, &count) || count < 1) {
-      error_ = "no RGBA8 + depth pbuffer config for OpenGL ES 1";
-      return;
-    }
+    if (!eglChooseConfig(display_, configAttributes, &config, 1, &count) || count < 1)
+      { error_ = "no RGBA8 + depth pbuffer config for OpenGL ES 1"; return; }
     const EGLint surfaceAttributes[] = {EGL_WIDTH, width, EGL_HEIGHT, height, EGL_NONE};
     surface_ = eglCreatePbufferSurface(display_, config, surfaceAttributes);
-    if (surface_ == EGL_NO_SURFACE) {
-      error_ = "eglCreatePbufferSurface failed";
-      return;
-    }
+    if (surface_ == EGL_NO_SURFACE) { error_ = "eglCreatePbufferSurface failed"; return; }
     eglBindAPI(EGL_OPENGL_ES_API);
     const EGLint contextAttributes[] = {EGL_CONTEXT_CLIENT_VERSION, 1, EGL_NONE};
     context_ = eglCreateContext(display_, config, EGL_NO_CONTEXT, contextAttributes);
-    if (context_ == EGL_NO_CONTEXT) {
-      error_ = "eglCreateContext (ES 1) failed";
-      return;
-    }
+    if (context_ == EGL_NO_CONTEXT) { error_ = "eglCreateContext (ES 1) failed"; return; }
     if (!makeCurrent()) error_ = "eglMakeCurrent failed";
   }
 

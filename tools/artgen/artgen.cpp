@@ -1,13 +1,14 @@
 // tessel_artgen: draws the keyboard's embedded artwork and writes it for the library.
 //
-//   tessel_artgen <image folder> [contact sheet.png]
+//   tessel_artgen <theme file> <image folder> [contact sheet.png]
 //
 // Writes one raw RGBA8 file per distinct picture (top row first, no padding), the assembler
 // file images.S that embeds them with .incbin, image_data.h that declares them with their exact
 // sizes, and optionally a PNG contact sheet of everything for review.
 //
-// The look: a light, calm keyboard (white character keys on cool grey, grey function keys, one
-// bank-blue accent for the done key and the typing cursor). Every picture is drawn at the size
+// The look: a calm keyboard whose colours come from the theme file (themes/light.theme: white
+// character keys on cool grey, grey function keys, one bank-blue accent for the done key and the
+// typing cursor; themes/dark.theme: its dark counterpart). Sizes and order never depend on it. Every picture is drawn at the size
 // the renderer shows it on the reference surface (1080 x 720, keys 108 x 180, surface mode 1),
 // and only inside the part of the texture that the renderer samples: character key faces in
 // the top-left 0.625 x 0.625 of their 128 x 256 image, the space key in the top 0.625, and so
@@ -30,24 +31,87 @@ using namespace artgen;
 
 namespace {
 
-// ---- palette
-const Color kBackgroundTop = hex(0xD5D9E0);
-const Color kBackgroundBottom = hex(0xC9CED6);
-const Color kKeyTop = hex(0xFFFFFF);
-const Color kKeyBottom = hex(0xF8F9FB);
-const Color kKeyHeldTop = hex(0xB4BCC8);
-const Color kKeyHeldBottom = hex(0xAAB2BE);
-const Color kFunctionTop = hex(0xAFB6C1);
-const Color kFunctionBottom = hex(0xA7AEB9);
-const Color kAccentTop = hex(0x2468DE);
-const Color kAccentBottom = hex(0x1B58C6);
-const Color kKeyShadow = hex(0x7C8592, 0.60f);
-const Color kAmbientShadow = hex(0x5A6270, 0.14f);
-const Color kInk = hex(0x171A1F);
-const Color kLabelInk = hex(0x1E232A);
-const Color kQuietInk = hex(0x5F6774);
-const Color kWhite = hex(0xFFFFFF);
-const Color kAccentInk = hex(0x1D5FD3);
+// ---- palette, from the theme file
+
+// A theme file holds one colour per line, "name = #RRGGBB" (an optional second colour after the
+// first gives a top-to-bottom ramp), '#' at the start of a line comments it out, and optionally
+// "font = FILE.ttf" (a file in the font folder; "font_bold" likewise is unused and reserved).
+struct Theme {
+  Color panelTop, panelBottom, keyTop, keyBottom, heldTop, heldBottom, functionTop, functionBottom;
+  Color accentTop, accentBottom, text, accentText, dot, cursor;
+  std::string font = "DejaVuSans.ttf";
+};
+
+Theme gTheme;
+
+std::uint32_t parseHex(const std::string& word, const std::string& line) {
+  if (word.size() != 7 || word[0] != '#' || word.find_first_not_of("0123456789abcdefABCDEF", 1) != std::string::npos)
+    throw std::runtime_error("theme: not a #RRGGBB colour in \"" + line + "\"");
+  return static_cast<std::uint32_t>(std::stoul(word.substr(1), nullptr, 16));
+}
+
+// Darkens a colour a little: the lower end of a key's ramp when the theme gives one colour.
+Color lower(Color c) { return mix(c, hex(0x000000), 0.03f); }
+
+Theme readTheme(const std::string& path) {
+  std::ifstream f(path);
+  if (!f) throw std::runtime_error("cannot read theme " + path);
+  struct Entry {
+    const char* name;
+    Color *top, *bottom;
+    bool seen;
+  };
+  Theme t;
+  Entry entries[] = {{"panel", &t.panelTop, &t.panelBottom, false},    {"key", &t.keyTop, &t.keyBottom, false},
+                     {"pressed", &t.heldTop, &t.heldBottom, false},   {"function", &t.functionTop, &t.functionBottom, false},
+                     {"accent", &t.accentTop, &t.accentBottom, false}, {"text", &t.text, nullptr, false},
+                     {"accent_text", &t.accentText, nullptr, false},   {"dot", &t.dot, nullptr, false},
+                     {"cursor", &t.cursor, nullptr, false}};
+  std::string line;
+  while (std::getline(f, line)) {
+    std::istringstream in(line);
+    std::string name, eq, first, second;
+    if (!(in >> name) || name[0] == '#') continue;
+    if (!(in >> eq >> first) || eq != "=") throw std::runtime_error("theme: expected \"name = value\" in \"" + line + "\"");
+    in >> second;
+    if (name == "font") {
+      t.font = first;
+      continue;
+    }
+    Entry* e = nullptr;
+    for (Entry& candidate : entries)
+      if (name == candidate.name) e = &candidate;
+    if (e == nullptr) throw std::runtime_error("theme: unknown colour \"" + name + "\"");
+    *e->top = hex(parseHex(first, line));
+    if (e->bottom) *e->bottom = second.empty() ? lower(*e->top) : hex(parseHex(second, line));
+    e->seen = true;
+  }
+  for (const Entry& e : entries)
+    if (!e.seen) throw std::runtime_error(std::string("theme: no colour for \"") + e.name + "\"");
+  return t;
+}
+
+// Colours the pictures use, all derived from the theme.
+Color kBackgroundTop, kBackgroundBottom, kKeyTop, kKeyBottom, kKeyHeldTop, kKeyHeldBottom, kFunctionTop,
+    kFunctionBottom, kAccentTop, kAccentBottom, kKeyShadow, kAmbientShadow, kInk, kLabelInk, kQuietInk, kOnAccent,
+    kAccentInk, kDot, kCursor, kFieldBody, kFieldRule;
+
+void applyTheme(const Theme& t) {
+  gTheme = t;
+  kBackgroundTop = t.panelTop, kBackgroundBottom = t.panelBottom;
+  kKeyTop = t.keyTop, kKeyBottom = t.keyBottom, kKeyHeldTop = t.heldTop, kKeyHeldBottom = t.heldBottom;
+  kFunctionTop = t.functionTop, kFunctionBottom = t.functionBottom;
+  kAccentTop = t.accentTop, kAccentBottom = t.accentBottom;
+  Color shadow = mix(t.panelBottom, hex(0x000000), 0.42f);
+  shadow.a = 0.60f;
+  kKeyShadow = shadow;
+  kAmbientShadow = mix(t.panelBottom, hex(0x000000), 0.6f);
+  kAmbientShadow.a = 0.14f;
+  kInk = t.text, kLabelInk = t.text, kQuietInk = mix(t.text, t.keyTop, 0.38f);
+  kOnAccent = t.accentText, kAccentInk = mix(t.accentTop, t.accentBottom, 0.5f);
+  kDot = t.dot, kCursor = t.cursor;
+  kFieldBody = t.keyTop, kFieldRule = mix(t.keyTop, t.text, 0.25f);
+}
 
 // ---- reference geometry (screen pixels): keys 108 x 180, grid unit 54 x 90
 constexpr float kKw = 108.0f, kKh = 180.0f, kUx = kKw / 2, kUy = kKh / 2, kAspect = kKw / kKh;
@@ -84,11 +148,12 @@ void paintKey(Canvas& c, float w, float h, const KeyLook& look, float radius = k
   c.fillGradient(roundRect(x0, y0, x1, y1, radius), look.top, look.bottom, y0, y1);
 }
 
-const KeyLook kCharKey{kKeyTop, kKeyBottom};
-const KeyLook kCharKeyHeld{kKeyHeldTop, kKeyHeldBottom};
-const KeyLook kFunctionKey{kFunctionTop, kFunctionBottom};
-const KeyLook kFunctionKeyHeld{kKeyTop, kKeyBottom};  // function keys light up white when held
-const KeyLook kAccentKey{kAccentTop, kAccentBottom};
+// Looks of the key faces (functions: the colours are known only once the theme is read).
+KeyLook charKey() { return {kKeyTop, kKeyBottom}; }
+KeyLook charKeyHeld() { return {kKeyHeldTop, kKeyHeldBottom}; }
+KeyLook functionKey() { return {kFunctionTop, kFunctionBottom}; }
+KeyLook functionKeyHeld() { return {kKeyTop, kKeyBottom}; }  // function keys light up when held
+KeyLook accentKey() { return {kAccentTop, kAccentBottom}; }
 
 // Character key faces: the renderer samples the top-left 80 x 160 of 128 x 256 and shows it
 // at 0.815 x 0.884 of a cell (88 x 159).
@@ -139,8 +204,8 @@ Canvas padDoneFace(int size, const KeyLook& look) {
   return c;
 }
 
-// The key balloon: drawn over a held key, its stem is exactly that key's face and its head
-// holds the enlarged glyph one key height higher. Full image 128 x 256 shown at about
+// The key balloon: drawn over a held key, its head holds the enlarged glyph one key height
+// higher and a short neck joins it to the key. Full image 128 x 256 shown at about
 // 254 x 503 around a point 0.04 key heights above the key's top edge.
 Canvas balloon() {
   const float halfW = (1 / kAspect) * 1.05f * 0.895f * 1.5f * kUx;
@@ -152,29 +217,61 @@ Canvas balloon() {
   const float glyphCy = cy - (kUy - 0.1f * kUy - 0.08f * kUy);
   const float headHalfW = 76.0f, headTop = glyphCy - 74.0f, headBottom = glyphCy + 80.0f;
   const Sdf head = roundRect(cx - headHalfW, headTop, cx + headHalfW, headBottom, 24.0f);
-  const Sdf stem = roundRect(cx - faceHalfW + 1.5f, headBottom - 40.0f, cx + faceHalfW - 1.5f,
-                             keyCy + faceHalfH - 3.0f, kKeyRadius);
+  // A neck down to just inside the held key's top edge, well narrower than the key: the balloon
+  // is scaled by key height, so a stem as wide as the face at the reference aspect came out
+  // narrower than wider keys (tablets, landscape); the held face itself stays visible below.
+  const float neckHalfW = 0.55f * faceHalfW, keyTop = keyCy - faceHalfH;
+  const Sdf stem = roundRect(cx - neckHalfW, headBottom - 40.0f, cx + neckHalfW, keyTop + 14.0f, 10.0f);
   const Sdf shape = smoothUnite(head, stem, 18.0f);
-  c.fill(shift(shape, 0, 1.0f), hex(0x4A5260, 0.22f), 7.0f);
+  c.fill(shift(shape, 0, 1.0f), Color{kKeyShadow.r, kKeyShadow.g, kKeyShadow.b, 0.22f}, 7.0f);
   c.fill(shift(shape, 0, 2.0f), kKeyShadow);
-  c.fill(outline(shape, 0.6f), hex(0x9098A4, 0.55f));
+  c.fill(outline(shape, 0.6f), Color{kFieldRule.r, kFieldRule.g, kFieldRule.b, 0.55f});
   c.fillGradient(shape, kKeyTop, kKeyBottom, headTop, keyCy + faceHalfH);
   return c;
 }
 
 // ---- glyphs: 64 x 128, the character centred on the image centre
 
-const TextStyle kGlyphStyle{"DejaVuSans.ttf", 68.0f, 2.8f};
-const TextStyle kLowerStyle{"DejaVuSans.ttf", 73.0f, 2.8f};
+TextStyle glyphStyle(bool lower) { return {gTheme.font, lower ? 73.0f : 68.0f, 2.8f}; }
+
+// Narrows a text mask to at most maxWidth columns (area filter) and keeps its height, so a wide
+// character (W, M, m, w, %, @) keeps the cap height or x-height of its group.
+TextMask fitWidth(TextMask m, int maxWidth) {
+  if (m.width <= maxWidth) return m;
+  const float f = static_cast<float>(maxWidth) / m.width;
+  std::vector<std::uint8_t> out(static_cast<std::size_t>(maxWidth) * m.height);
+  for (int y = 0; y < m.height; ++y)
+    for (int x = 0; x < maxWidth; ++x) {
+      const float a = x / f, b = (x + 1) / f;  // source span of this column
+      float sum = 0;
+      for (int k = static_cast<int>(a); k < static_cast<int>(std::ceil(b)) && k < m.width; ++k)
+        sum += m.coverage[static_cast<std::size_t>(y) * m.width + k] * (std::min(b, k + 1.0f) - std::max(a, static_cast<float>(k)));
+      out[static_cast<std::size_t>(y) * maxWidth + x] = static_cast<std::uint8_t>(std::lround(std::min(255.0f, sum * f)));
+    }
+  m.coverage = std::move(out);
+  m.width = maxWidth;
+  return m;
+}
+
+void paintText(Canvas& c, const TextMask& m, float cx, float baseline, Color ink) {
+  c.paintMask(m.coverage, m.width, m.height, static_cast<int>(std::lround(cx - m.width / 2.0f)),
+              static_cast<int>(std::lround(baseline)) - m.top, ink);
+}
+
+// Glyph edges are steepened to about one texel: the top pop-up's surface keeps alpha squared
+// (it blends onto transparent black), which thins soft edges, so with a soft ramp the same glyph
+// looks regular there and bold in the keyboard's balloon. A steep edge looks the same in both.
+void steepen(TextMask& m) {
+  for (std::uint8_t& v : m.coverage) v = static_cast<std::uint8_t>(std::clamp((v - 128) * 2 + 128, 0, 255));
+}
 
 std::vector<std::uint8_t> glyphImage(char ch, bool lower) {
   Canvas c(64, 128);
-  TextStyle st = lower ? kLowerStyle : kGlyphStyle;
+  const TextStyle st = glyphStyle(lower);
   const float baseline = lower ? 64.0f + xHeight(st) / 2 + 2.0f : 64.0f + capHeight(st) / 2;
-  const std::string s(1, ch);
-  TextMask m = renderText(st, s);
-  if (m.width > 56) st.emPixels *= 56.0f / m.width;  // W, M, m, w, %, @: narrow the widest
-  drawTextCentered(c, st, s, 32.0f, baseline, kInk);
+  TextMask m = fitWidth(renderText(st, std::string(1, ch)), 56);
+  steepen(m);
+  paintText(c, m, 32.0f, baseline, kInk);
   return c.toRgba8();
 }
 
@@ -201,16 +298,18 @@ std::vector<char> symbolPage(const std::string& pageSet) {
 
 // ---- labels and icons
 
-const TextStyle kSwitchLabelStyle{"DejaVuSans.ttf", 52.0f, 2.6f};
-const TextStyle kDoneLabelStyle{"DejaVuSans.ttf", 36.0f, 1.8f};
-const TextStyle kPadLabelStyle{"DejaVuSans.ttf", 33.0f, 1.6f};
+// Labels are sized by the cap height they show on the reference surface, whatever the scale
+// of their quad (screen pixels per texel, measured on the reference surface), so every function
+// key's text stands at one visual size; a label too wide for its image is narrowed, not shrunk.
+constexpr float kLabelCapPx = 30.0f;
 
-Canvas label(int w, int h, const TextStyle& style, const std::string& text, Color ink) {
+Canvas label(int w, int h, float texelPx, const std::string& text, Color ink, float capPx = kLabelCapPx) {
   Canvas c(w, h);
-  TextStyle st = style;
-  const TextMask m = renderText(st, text);
-  if (m.width > w - 12) st.emPixels *= (w - 12.0f) / m.width;
-  drawLabel(c, st, text, w / 2.0f, h / 2.0f, ink);
+  TextStyle st{gTheme.font, 40.0f, 0.0f};
+  st.emPixels *= capPx / texelPx / capHeight(st);
+  st.embolden = st.emPixels * 0.05f;
+  const TextMask m = fitWidth(renderText(st, text), w - 8);
+  paintText(c, m, w / 2.0f, h / 2.0f + capHeight(st) / 2, ink);
   return c;
 }
 
@@ -218,7 +317,7 @@ Canvas label(int w, int h, const TextStyle& style, const std::string& text, Colo
 // over a quad larger than the key, so the content stays small and central.
 Canvas spaceLabel() {
   Canvas c(256, 128);
-  const TextStyle st{"DejaVuSans.ttf", 14.5f, 0.9f};
+  const TextStyle st{gTheme.font, 14.5f, 0.9f};
   const std::string text = "Secure keyboard";
   const TextMask m = renderText(st, text);
   const float lockW = 11.0f, gap = 5.0f;
@@ -255,7 +354,7 @@ Canvas deleteIcon() {
 }
 
 Canvas symbolShiftIcon() {
-  return label(64, 64, TextStyle{"DejaVuSans.ttf", 24.0f, 1.8f}, "#+=", kLabelInk);
+  return label(64, 64, 1.125f, "#+=", kLabelInk, 26.0f);  // shown at 72 x 72 px, narrower than the rest
 }
 
 // Keyboard-hide chevron in the lower half of the pad's done key: light, with a dark rim, so it
@@ -263,8 +362,8 @@ Canvas symbolShiftIcon() {
 Canvas padDoneIcon() {
   Canvas c(64, 64);
   const Sdf chevron = unite(capsule(19, 26, 32, 39, 3.6f), capsule(32, 39, 45, 26, 3.6f));
-  c.fill(outline(chevron, 1.3f), hex(0x123E8C, 0.55f));
-  c.fill(chevron, hex(0xE3ECFB));
+  c.fill(outline(chevron, 1.3f), Color{kAccentBottom.r * 0.5f, kAccentBottom.g * 0.5f, kAccentBottom.b * 0.5f, 0.55f});
+  c.fill(chevron, mix(kOnAccent, kAccentTop, 0.12f));
   return c;
 }
 
@@ -280,23 +379,23 @@ Canvas background() {
 // is built from rows: a hairline on top, white body, a blue underline at the bottom.
 Canvas fieldFrame() {
   Canvas c(64, 64);
-  c.fill(roundRect(-10, -10, 74, 74, 0), kWhite);
-  c.fill(roundRect(-10, -10, 74, 1, 0), hex(0xB9C0CA));
-  c.fill(roundRect(-10, 1, 74, 2, 0), hex(0xE9ECF0));
-  c.fill(roundRect(-10, 60, 74, 61, 0), hex(0x8FB0EA));
+  c.fill(roundRect(-10, -10, 74, 74, 0), kFieldBody);
+  c.fill(roundRect(-10, -10, 74, 1, 0), kFieldRule);
+  c.fill(roundRect(-10, 1, 74, 2, 0), mix(kFieldBody, kFieldRule, 0.3f));
+  c.fill(roundRect(-10, 60, 74, 61, 0), mix(kFieldBody, kAccentInk, 0.5f));
   c.fill(roundRect(-10, 61, 74, 74, 0), kAccentInk);
   return c;
 }
 
 Canvas maskDot() {
   Canvas c(64, 64);
-  c.fill(circle(32, 32, 16.5f), kLabelInk);
+  c.fill(circle(32, 32, 16.5f), kDot);
   return c;
 }
 
 Canvas cursor() {
   Canvas c(64, 64);
-  c.fill(capsule(32, 7, 32, 57, 4.0f), kAccentInk);
+  c.fill(capsule(32, 7, 32, 57, 4.0f), kCursor);
   return c;
 }
 
@@ -402,46 +501,47 @@ void drawEverything() {
   for (char d = '0'; d <= '9'; ++d) keypad.at(tessel::keypadIndexOf(static_cast<std::uint8_t>(d))) = d;
   addGlyphGroup("glyphs_pad_digits", keypad, false);
 
-  add("key_char", charKeyFace(kCharKey));
-  add("key_char_held", charKeyFace(kCharKeyHeld));
+  add("key_char", charKeyFace(charKey()));
+  add("key_char_held", charKeyFace(charKeyHeld()));
   add("key_balloon", balloon());
-  add("key_space", spaceFace(kCharKey));
-  add("key_space_held", spaceFace(kCharKeyHeld));
+  add("key_space", spaceFace(charKey()));
+  add("key_space_held", spaceFace(charKeyHeld()));
   add("label_space", spaceLabel());
-  add("key_shift_delete", shiftDeleteFace(kFunctionKey));
-  add("key_shift_delete_held", shiftDeleteFace(kFunctionKeyHeld));
-  add("key_switch", barFace(256, 2 * 2.25f * kUx, 0.9f * kKh, kFunctionKey));
-  add("key_switch_held", barFace(256, 2 * 2.28f * kUx, 0.892f * kKh, kFunctionKeyHeld));
-  add("key_done", barFace(128, 2 * 2.315f * kUx, 0.884f * kKh, kAccentKey));
+  add("key_shift_delete", shiftDeleteFace(functionKey()));
+  add("key_shift_delete_held", shiftDeleteFace(functionKeyHeld()));
+  add("key_switch", barFace(256, 2 * 2.25f * kUx, 0.9f * kKh, functionKey()));
+  add("key_switch_held", barFace(256, 2 * 2.28f * kUx, 0.892f * kKh, functionKeyHeld()));
+  add("key_done", barFace(128, 2 * 2.315f * kUx, 0.884f * kKh, accentKey()));
   add("icon_delete", deleteIcon());
   add("icon_shift_off", shiftIcon(false));
   add("icon_shift_on", shiftIcon(true));
   add("icon_symbol_shift", symbolShiftIcon());
-  add("label_to_letters", label(256, 128, kSwitchLabelStyle, "ABC", kLabelInk));
-  add("label_to_symbols", label(256, 128, kSwitchLabelStyle, "?123", kLabelInk));
-  add("label_done", label(128, 64, kDoneLabelStyle, "Done", kWhite));
-  add("label_done_held", label(128, 64, kDoneLabelStyle, "Done", kAccentInk));
-  add("label_to_pad", label(256, 128, kSwitchLabelStyle, "123", kLabelInk));
-  add("key_pad", padFace(kCharKey));
-  add("key_pad_alt", padFace(kFunctionKey));
-  add("key_pad_done", padDoneFace(128, kAccentKey));
-  add("key_pad_done_held", padDoneFace(256, kFunctionKeyHeld));
-  add("label_pad_clear", label(128, 64, kPadLabelStyle, "Clear", kLabelInk));
-  add("label_pad_ok", label(128, 64, kPadLabelStyle, "OK", kAccentInk));
+  add("label_to_letters", label(256, 128, 0.9f, "ABC", kLabelInk));
+  add("label_to_symbols", label(256, 128, 0.9f, "?123", kLabelInk));
+  add("label_done", label(128, 64, 1.01f, "Done", kOnAccent));
+  add("label_done_held", label(128, 64, 1.01f, "Done", kAccentInk));
+  add("label_to_pad", label(256, 128, 0.9f, "123", kLabelInk));
+  add("key_pad", padFace(charKey()));
+  add("key_pad_alt", padFace(functionKey()));
+  add("key_pad_done", padDoneFace(128, accentKey()));
+  add("key_pad_done_held", padDoneFace(256, functionKeyHeld()));
+  add("label_pad_clear", label(128, 64, 0.95f, "Clear", kLabelInk));
+  add("label_pad_ok", label(128, 64, 0.95f, "OK", kAccentInk));
   add("icon_pad_done", padDoneIcon());
 }
 
 }  // namespace
 
 int main(int argc, char** argv) {
-  if (argc < 2) {
-    std::fprintf(stderr, "usage: %s <image folder> [contact sheet.png]\n", argv[0]);
+  if (argc < 3) {
+    std::fprintf(stderr, "usage: %s <theme file> <image folder> [contact sheet.png]\n", argv[0]);
     return 2;
   }
   try {
+    applyTheme(readTheme(argv[1]));
     drawEverything();
-    writeOutputs(argv[1]);
-    if (argc > 2) writeContactSheet(argv[2]);
+    writeOutputs(argv[2]);
+    if (argc > 3) writeContactSheet(argv[3]);
   } catch (const std::exception& e) {
     std::fprintf(stderr, "tessel_artgen: %s\n", e.what());
     return 1;
