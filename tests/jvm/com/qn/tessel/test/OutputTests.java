@@ -206,9 +206,8 @@ final class OutputTests {
       // A type-48 envelope offered as type 47 without the encryption key: its payload is no RSA value.
       String out48 = getNativeContent(k.handle, TIMESTAMP);
       Check.equal("WrongType", javaRefusal(47, out48), "library refuses 48 as 47");
-      if (Bank.cpp(java.util.List.of("--type", "47", "--key", Bank.appKeyPem, "-"), out48).exit() == 0) {
-        System.out.println("    note: this tessel_open still takes a type-48 envelope as type 47 without --enc-key");
-      }
+      Check.equal(1, Bank.cpp(java.util.List.of("--type", "47", "--key", Bank.appKeyPem, "-"), out48).exit(),
+          "tessel_open refuses 48 as 47");
       clearNativePlaintext(k.handle);
       Check.equal(null, getNativeContent(k.handle, TIMESTAMP), "an empty password cannot be hashed");
       Check.equal("The format of the text is wrong!", getNativeLastError(k.handle), "its error");
