@@ -16,6 +16,7 @@
 
 #include <atomic>
 #include <cstring>
+#include <new>
 
 #include "crypto/wipe.h"
 
@@ -404,9 +405,14 @@ struct Montgomery {
 
 template <typename L, typename W>
 void modExpMontgomery(const BigNumber& x, const BigNumber& e, const BigNumber& modulus,
-                      BigNumber& result) noexcept {
+                      const Montgomery<L, W>* prepared, BigNumber& result) noexcept {
   Montgomery<L, W> ctx;
-  ctx.setUp(modulus);
+  if (prepared != nullptr) {
+    ctx = *prepared;  // a private copy: the scratch is per call, the prepared one is shared
+    ctx.fast = RowKernel<L, W>::accelerated();
+  } else {
+    ctx.setUp(modulus);
+  }
   L xm[maxLimbs<L>()] = {};
   L acc[maxLimbs<L>()] = {};
   Montgomery<L, W>::load(x, acc, ctx.n);
@@ -422,6 +428,12 @@ void modExpMontgomery(const BigNumber& x, const BigNumber& e, const BigNumber& m
   wipeObject(acc);
   wipeObject(ctx);
 }
+
+#if defined(__SIZEOF_INT128__)
+using DefaultMontgomery = Montgomery<u64, unsigned __int128>;
+#else
+using DefaultMontgomery = Montgomery<u32, u64>;
+#endif
 
 // Even moduli (never an RSA key): each product is reduced by division.
 void modExpDivision(const BigNumber& x, const BigNumber& e, const BigNumber& modulus,
@@ -446,7 +458,7 @@ void modExpDivision(const BigNumber& x, const BigNumber& e, const BigNumber& mod
 enum class Width { kDefault, kPortable };
 
 bool modExp(const BigNumber& base, const BigNumber& exponent, const BigNumber& modulus,
-            BigNumber& result, Width width) noexcept {
+            BigNumber& result, Width width, const DefaultMontgomery* prepared = nullptr) noexcept {
   if (modulus.count == 0) return false;
   const BigNumber e = exponent;  // result may alias the exponent
   BigNumber x;
@@ -467,13 +479,9 @@ bool modExp(const BigNumber& base, const BigNumber& exponent, const BigNumber& m
   } else if ((modulus.limbs[0] & 1u) == 0) {
     modExpDivision(x, e, modulus, result);
   } else if (width == Width::kPortable) {
-    modExpMontgomery<u32, u64>(x, e, modulus, result);
+    modExpMontgomery<u32, u64>(x, e, modulus, nullptr, result);
   } else {
-#if defined(__SIZEOF_INT128__)
-    modExpMontgomery<u64, unsigned __int128>(x, e, modulus, result);
-#else
-    modExpMontgomery<u32, u64>(x, e, modulus, result);
-#endif
+    modExpMontgomery(x, e, modulus, prepared, result);
   }
   wipeObject(x);
   return true;
@@ -507,6 +515,12 @@ u32 divideByWord(BigNumber& a, u32 word) noexcept {
 }
 
 }  // namespace
+
+// The modulus and its Montgomery set-up; never written after bnPrepareModulus returns.
+struct BnPreparedModulus {
+  BigNumber modulus;
+  DefaultMontgomery montgomery;
+};
 
 BigNumber bnZero() noexcept {
   BigNumber z;
@@ -682,6 +696,28 @@ void bnAllowAssemblyKernel(bool allowed) noexcept {
 #else
   (void)allowed;
 #endif
+}
+
+BnPreparedModulus* bnPrepareModulus(const BigNumber& modulus) noexcept {
+  if (modulus.count == 0 || (modulus.limbs[0] & 1u) == 0) return nullptr;
+  BnPreparedModulus* prepared = new (std::nothrow) BnPreparedModulus();
+  if (prepared == nullptr) return nullptr;
+  prepared->modulus = modulus;
+  prepared->montgomery.setUp(modulus);
+  return prepared;
+}
+
+void bnReleasePrepared(BnPreparedModulus* prepared) noexcept {
+  if (prepared == nullptr) return;
+  wipeObject(*prepared);
+  delete prepared;
+}
+
+const BigNumber& bnPreparedValue(const BnPreparedModulus& prepared) noexcept { return prepared.modulus; }
+
+bool bnModExpPrepared(const BigNumber& base, const BigNumber& exponent, const BnPreparedModulus& prepared,
+                      BigNumber& result) noexcept {
+  return modExp(base, exponent, prepared.modulus, result, Width::kDefault, &prepared.montgomery);
 }
 
 bool bnModExpPortable(const BigNumber& base, const BigNumber& exponent, const BigNumber& modulus,
