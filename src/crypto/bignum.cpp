@@ -713,8 +713,6 @@ void bnReleasePrepared(BnPreparedModulus* prepared) noexcept {
   delete prepared;
 }
 
-const BigNumber& bnPreparedValue(const BnPreparedModulus& prepared) noexcept { return prepared.modulus; }
-
 bool bnModExpPrepared(const BigNumber& base, const BigNumber& exponent, const BnPreparedModulus& prepared,
                       BigNumber& result) noexcept {
   return modExp(base, exponent, prepared.modulus, result, Width::kDefault, &prepared.montgomery);

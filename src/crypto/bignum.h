@@ -75,7 +75,6 @@ bool bnModExpPortable(const BigNumber& base, const BigNumber& exponent, const Bi
 struct BnPreparedModulus;
 BnPreparedModulus* bnPrepareModulus(const BigNumber& modulus) noexcept;
 void bnReleasePrepared(BnPreparedModulus* prepared) noexcept;
-const BigNumber& bnPreparedValue(const BnPreparedModulus& prepared) noexcept;
 // bnModExp with the prepared modulus; the same result, without the per-modulus set-up.
 bool bnModExpPrepared(const BigNumber& base, const BigNumber& exponent, const BnPreparedModulus& prepared,
                       BigNumber& result) noexcept;
