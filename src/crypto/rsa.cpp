@@ -102,7 +102,11 @@ KeyRef preparedKey(const char* text) noexcept {
   }
   ModulusCache& c = cache();
   std::lock_guard<std::mutex> guard(c.lock);
-  for (int j = kCachedModuli - 1; j > 0; --j) c.slots[j] = std::move(c.slots[j - 1]);
+  // Another thread may have made the same entry meanwhile: keep one copy in the slots.
+  int evicted = kCachedModuli - 1;
+  for (int i = 0; i < kCachedModuli && c.slots[i]; ++i)
+    if (c.slots[i]->length == length && std::memcmp(c.slots[i]->text, text, length) == 0) evicted = i;
+  for (int j = evicted; j > 0; --j) c.slots[j] = std::move(c.slots[j - 1]);
   c.slots[0] = made;
   return made;
 }
