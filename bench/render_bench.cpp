@@ -1,5 +1,8 @@
 // One keyboard frame on Mesa's llvmpipe (GLES 1.1, offscreen 1080 x 720): frames per second
-// including glFinish, set against the library's own CPU time per frame.
+// including glFinish, set against the library's own CPU time per frame. And start-up: for the
+// keyboard and both pop-ups, the time from surface created to the first drawn frame (layout
+// build, texture upload, geometry, one frame, glFinish) on a fresh context, with the library's
+// own CPU share of it and the pixel bytes it uploads.
 //
 // To tell the library's cost apart from the driver's, this program interposes the GL entry
 // points a frame uses: the library (linked statically) calls these definitions, which count
@@ -19,6 +22,7 @@
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <algorithm>
 #include <string>
 
 #include "render/surfaces.h"
@@ -67,6 +71,29 @@ TESSEL_FORWARD(glDrawArrays, (GLenum a, GLint b, GLsizei c), (a, b, c))
 TESSEL_FORWARD(glEnable, (GLenum a), (a))
 TESSEL_FORWARD(glDisable, (GLenum a), (a))
 TESSEL_FORWARD(glBlendFunc, (GLenum a, GLenum b), (a, b))
+// Start-up only: state set-up and texture upload.
+TESSEL_FORWARD(glShadeModel, (GLenum a), (a))
+TESSEL_FORWARD(glHint, (GLenum a, GLenum b), (a, b))
+TESSEL_FORWARD(glDepthFunc, (GLenum a), (a))
+TESSEL_FORWARD(glEnableClientState, (GLenum a), (a))
+TESSEL_FORWARD(glViewport, (GLint a, GLint b, GLsizei c, GLsizei d), (a, b, c, d))
+TESSEL_FORWARD(glTexParameterf, (GLenum a, GLenum b, GLfloat c), (a, b, c))
+TESSEL_FORWARD(glTexEnvf, (GLenum a, GLenum b, GLfloat c), (a, b, c))
+TESSEL_FORWARD(glGenTextures, (GLsizei a, GLuint* b), (a, b))
+
+namespace {
+long long gUploadedBytes = 0;
+}
+
+extern "C" GL_API void GL_APIENTRY glTexImage2D(GLenum target, GLint level, GLint internal, GLsizei width,
+                                                GLsizei height, GLint border, GLenum format, GLenum type,
+                                                const void* pixels) {
+  static const auto next =
+      real<void(GL_APIENTRY*)(GLenum, GLint, GLint, GLsizei, GLsizei, GLint, GLenum, GLenum, const void*)>("glTexImage2D");
+  ++gCalls;
+  gUploadedBytes += 4LL * width * height;
+  if (!gNullDriver) next(target, level, internal, width, height, border, format, type, pixels);
+}
 
 namespace {
 
@@ -134,6 +161,81 @@ void BM_KeyboardFrame(benchmark::State& state) {
   state.counters["own_share_of_issue"] = own / (issue / frames);
 }
 BENCHMARK(BM_KeyboardFrame)->Arg(0)->Arg(1)->ArgName("pad")->Unit(benchmark::kMillisecond)->UseRealTime();
+
+// Surface created -> changed -> first frame drawn, as the app's GL thread runs them.
+struct SurfaceKind {
+  const char* name;
+  int width, height;
+  void (*created)(KeyboardSession&);
+  void (*changed)(KeyboardSession&, int, int);
+  void (*draw)(const KeyboardSession&);
+};
+void keyboardChanged(KeyboardSession& s, int w, int h) { tessel::mainSurfaceChanged(s, w, h, 1); }
+void fieldDraw(const KeyboardSession& s) { tessel::popDrawFrame(s, true); }
+const SurfaceKind kSurfaces[] = {
+    {"keyboard", 1080, 720, tessel::mainSurfaceCreated, keyboardChanged, tessel::mainDrawFrame},
+    {"field pop-up", 1080, 160, tessel::popSurfaceCreated, tessel::popSurfaceChanged, fieldDraw},
+    {"top pop-up", 240, 320, tessel::popTopSurfaceCreated, tessel::popTopSurfaceChanged, tessel::popTopDrawFrame},
+};
+
+void startUp(const SurfaceKind& kind, KeyboardSession& s) {
+  kind.created(s);
+  kind.changed(s, kind.width, kind.height);
+  kind.draw(s);
+}
+
+// Each iteration runs on a fresh context (made outside the timing) so that the textures of the
+// previous start-up, which the library never deletes, do not pile up in the driver.
+void BM_StartUp(benchmark::State& state) {
+  const SurfaceKind& kind = kSurfaces[state.range(0)];
+  state.SetLabel(kind.name);
+  const int handle = tessel::createSession("bench-start-up");
+  KeyboardSession* s = tessel::sessionAt(handle);
+  if (s != nullptr && state.range(0) != 0) {  // the pop-ups come up after the keyboard has its layout
+    gNullDriver = true;
+    startUp(kSurfaces[0], *s);
+    gNullDriver = false;
+  }
+  double wall = 0;
+  long long bytes = 0;
+  for (auto _ : state) {
+    state.PauseTiming();
+    {
+      tessel::test::GlesContext gl(kind.width, kind.height);
+      if (s == nullptr || !gl.ok()) {
+        state.SkipWithError(("no offscreen GLES 1.1: " + gl.error()).c_str());
+        break;
+      }
+      gNullDriver = false;
+      gUploadedBytes = 0;
+      state.ResumeTiming();
+      timespec t0{}, t1{};
+      clock_gettime(CLOCK_MONOTONIC, &t0);
+      startUp(kind, *s);
+      glFinish();
+      clock_gettime(CLOCK_MONOTONIC, &t1);
+      state.PauseTiming();
+      wall += static_cast<double>(t1.tv_sec - t0.tv_sec) + (t1.tv_nsec - t0.tv_nsec) * 1e-9;
+      bytes = gUploadedBytes;
+    }
+    state.ResumeTiming();
+  }
+  // The same start-up against the null driver: the library's own CPU time.
+  constexpr int kNullRuns = 200;
+  gNullDriver = true;
+  const double c0 = threadSeconds();
+  if (s != nullptr)
+    for (int k = 0; k < kNullRuns; ++k) startUp(kind, *s);
+  const double own = (threadSeconds() - c0) / kNullRuns;
+  gNullDriver = false;
+  tessel::destroySession(handle);
+  const double perStartUp = wall / static_cast<double>(std::max<std::int64_t>(1, state.iterations()));
+  state.counters["start_up_ms"] = perStartUp * 1e3;
+  state.counters["own_us"] = own * 1e6;
+  state.counters["own_share_pct"] = 100 * own / perStartUp;
+  state.counters["upload_MB"] = static_cast<double>(bytes) / 1e6;
+}
+BENCHMARK(BM_StartUp)->DenseRange(0, 2)->ArgName("surface")->Unit(benchmark::kMillisecond)->Iterations(15);
 
 }  // namespace
 

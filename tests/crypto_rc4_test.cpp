@@ -1,6 +1,5 @@
-// RC4 against RFC 6229's keystream vectors (seven key lengths, offsets 0..4096, which check
-// both the key schedule and rc4Discard), and against OpenSSL for key lengths 1..256 and the
-// drops the envelope uses, in place and out of place.
+// RC4 against RFC 6229's keystreams (seven key lengths, offsets 0..4096: the key schedule and
+// rc4Discard) and OpenSSL for key lengths 1..256 and the envelope's drops, in and out of place.
 #include <gtest/gtest.h>
 
 #include <string>

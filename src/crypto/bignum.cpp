@@ -16,6 +16,7 @@
 
 #include <atomic>
 #include <cstring>
+#include <new>
 
 #include "crypto/wipe.h"
 
@@ -190,21 +191,65 @@ inline L mulAddRow(L* t, const L* a, int n, L b) noexcept {
 
 // The same row on x86-64 with BMI2/ADX: mulx leaves the flags alone, and adcx/adox run two
 // independent carry chains (CF adds t[j], OF adds the previous high word), so the additions of
-// neighbouring limbs overlap. Four limbs per block, then single limbs; loop control uses only
-// lea, mov and jrcxz, which keep both flags intact. Chosen at run time from CPUID.
+// neighbouring limbs overlap. Eight limbs per block, then one block of four if left, then
+// single limbs; loop control uses only lea, mov, jmp and jrcxz, which keep both flags intact.
+// Chosen at run time from CPUID.
 inline std::uint64_t mulAddRowAdx(std::uint64_t* t, const std::uint64_t* a, int n,
                                   std::uint64_t b) noexcept {
   std::uint64_t hi = 0;
-  const long blocks = n >> 2, rest = n & 3;
+  const long blocks = n >> 3, four = (n >> 2) & 1, rest = n & 3;
   __asm__ volatile(
       "xor %%r10d, %%r10d\n\t"  // CF = OF = 0
       "mov %[blocks], %%rcx\n"
       "1:\n\t"
-      "jrcxz 2f\n\t"
-      "mulx (%[a]), %%r10, %%r11\n\t"
-      "adcx (%[t]), %%r10\n\t"
+      "jrcxz 6f\n\t"  // jrcxz reaches only 127 bytes: hop over a long jump out
+      "jmp 7f\n"
+      "6:\n\t"
+      "jmp 2f\n"
+      "7:\n\t"
+      "mulx 0(%[a]), %%r10, %%r11\n\t"
+      "adcx 0(%[t]), %%r10\n\t"
       "adox %[hi], %%r10\n\t"
-      "mov %%r10, (%[t])\n\t"
+      "mov %%r10, 0(%[t])\n\t"
+      "mulx 8(%[a]), %%r10, %[hi]\n\t"
+      "adcx 8(%[t]), %%r10\n\t"
+      "adox %%r11, %%r10\n\t"
+      "mov %%r10, 8(%[t])\n\t"
+      "mulx 16(%[a]), %%r10, %%r11\n\t"
+      "adcx 16(%[t]), %%r10\n\t"
+      "adox %[hi], %%r10\n\t"
+      "mov %%r10, 16(%[t])\n\t"
+      "mulx 24(%[a]), %%r10, %[hi]\n\t"
+      "adcx 24(%[t]), %%r10\n\t"
+      "adox %%r11, %%r10\n\t"
+      "mov %%r10, 24(%[t])\n\t"
+      "mulx 32(%[a]), %%r10, %%r11\n\t"
+      "adcx 32(%[t]), %%r10\n\t"
+      "adox %[hi], %%r10\n\t"
+      "mov %%r10, 32(%[t])\n\t"
+      "mulx 40(%[a]), %%r10, %[hi]\n\t"
+      "adcx 40(%[t]), %%r10\n\t"
+      "adox %%r11, %%r10\n\t"
+      "mov %%r10, 40(%[t])\n\t"
+      "mulx 48(%[a]), %%r10, %%r11\n\t"
+      "adcx 48(%[t]), %%r10\n\t"
+      "adox %[hi], %%r10\n\t"
+      "mov %%r10, 48(%[t])\n\t"
+      "mulx 56(%[a]), %%r10, %[hi]\n\t"
+      "adcx 56(%[t]), %%r10\n\t"
+      "adox %%r11, %%r10\n\t"
+      "mov %%r10, 56(%[t])\n\t"
+      "lea 64(%[a]), %[a]\n\t"
+      "lea 64(%[t]), %[t]\n\t"
+      "lea -1(%%rcx), %%rcx\n\t"
+      "jmp 1b\n"
+      "2:\n\t"
+      "mov %[four], %%rcx\n\t"
+      "jrcxz 3f\n\t"
+      "mulx 0(%[a]), %%r10, %%r11\n\t"
+      "adcx 0(%[t]), %%r10\n\t"
+      "adox %[hi], %%r10\n\t"
+      "mov %%r10, 0(%[t])\n\t"
       "mulx 8(%[a]), %%r10, %[hi]\n\t"
       "adcx 8(%[t]), %%r10\n\t"
       "adox %%r11, %%r10\n\t"
@@ -218,13 +263,11 @@ inline std::uint64_t mulAddRowAdx(std::uint64_t* t, const std::uint64_t* a, int 
       "adox %%r11, %%r10\n\t"
       "mov %%r10, 24(%[t])\n\t"
       "lea 32(%[a]), %[a]\n\t"
-      "lea 32(%[t]), %[t]\n\t"
-      "lea -1(%%rcx), %%rcx\n\t"
-      "jmp 1b\n"
-      "2:\n\t"
-      "mov %[rest], %%rcx\n"
+      "lea 32(%[t]), %[t]\n"
       "3:\n\t"
-      "jrcxz 4f\n\t"
+      "mov %[rest], %%rcx\n"
+      "4:\n\t"
+      "jrcxz 5f\n\t"
       "mulx (%[a]), %%r10, %%r11\n\t"
       "adcx (%[t]), %%r10\n\t"
       "adox %[hi], %%r10\n\t"
@@ -233,13 +276,13 @@ inline std::uint64_t mulAddRowAdx(std::uint64_t* t, const std::uint64_t* a, int 
       "lea 8(%[a]), %[a]\n\t"
       "lea 8(%[t]), %[t]\n\t"
       "lea -1(%%rcx), %%rcx\n\t"
-      "jmp 3b\n"
-      "4:\n\t"
+      "jmp 4b\n"
+      "5:\n\t"
       "mov $0, %%r10d\n\t"  // mov keeps the flags: fold both pending carries into hi
       "adcx %%r10, %[hi]\n\t"
       "adox %%r10, %[hi]\n\t"
       : [t] "+r"(t), [a] "+r"(a), [hi] "+r"(hi)
-      : "d"(b), [blocks] "r"(blocks), [rest] "r"(rest)
+      : "d"(b), [blocks] "r"(blocks), [four] "r"(four), [rest] "r"(rest)
       : "rcx", "r10", "r11", "cc", "memory");
   return hi;
 }
@@ -389,12 +432,10 @@ struct Montgomery {
     // mask rather than by branch.
     const L* r = t + n;
     L borrow = 0;
-    for (int j = 0; j < n; ++j) {
-      const L x = r[j];
-      const L d = static_cast<L>(x - mod[j]);
-      const L b1 = static_cast<L>(x < mod[j]);
-      diff[j] = static_cast<L>(d - borrow);
-      borrow = static_cast<L>(b1 | static_cast<L>(d < borrow));
+    for (int j = 0; j < n; ++j) {  // double-width difference: compilers emit a sub/sbb chain
+      const W d = static_cast<W>(static_cast<W>(r[j]) - mod[j] - borrow);
+      diff[j] = static_cast<L>(d);
+      borrow = static_cast<L>(d >> (2 * bits - 1));
     }
     // Keep r when r < n, i.e. the subtraction borrowed out of the top limb too.
     const L keep = static_cast<L>(0 - static_cast<L>(borrow > top));
@@ -404,9 +445,14 @@ struct Montgomery {
 
 template <typename L, typename W>
 void modExpMontgomery(const BigNumber& x, const BigNumber& e, const BigNumber& modulus,
-                      BigNumber& result) noexcept {
+                      const Montgomery<L, W>* prepared, BigNumber& result) noexcept {
   Montgomery<L, W> ctx;
-  ctx.setUp(modulus);
+  if (prepared != nullptr) {
+    ctx = *prepared;  // a private copy: the scratch is per call, the prepared one is shared
+    ctx.fast = RowKernel<L, W>::accelerated();
+  } else {
+    ctx.setUp(modulus);
+  }
   L xm[maxLimbs<L>()] = {};
   L acc[maxLimbs<L>()] = {};
   Montgomery<L, W>::load(x, acc, ctx.n);
@@ -422,6 +468,12 @@ void modExpMontgomery(const BigNumber& x, const BigNumber& e, const BigNumber& m
   wipeObject(acc);
   wipeObject(ctx);
 }
+
+#if defined(__SIZEOF_INT128__)
+using DefaultMontgomery = Montgomery<u64, unsigned __int128>;
+#else
+using DefaultMontgomery = Montgomery<u32, u64>;
+#endif
 
 // Even moduli (never an RSA key): each product is reduced by division.
 void modExpDivision(const BigNumber& x, const BigNumber& e, const BigNumber& modulus,
@@ -446,7 +498,7 @@ void modExpDivision(const BigNumber& x, const BigNumber& e, const BigNumber& mod
 enum class Width { kDefault, kPortable };
 
 bool modExp(const BigNumber& base, const BigNumber& exponent, const BigNumber& modulus,
-            BigNumber& result, Width width) noexcept {
+            BigNumber& result, Width width, const DefaultMontgomery* prepared = nullptr) noexcept {
   if (modulus.count == 0) return false;
   const BigNumber e = exponent;  // result may alias the exponent
   BigNumber x;
@@ -467,13 +519,9 @@ bool modExp(const BigNumber& base, const BigNumber& exponent, const BigNumber& m
   } else if ((modulus.limbs[0] & 1u) == 0) {
     modExpDivision(x, e, modulus, result);
   } else if (width == Width::kPortable) {
-    modExpMontgomery<u32, u64>(x, e, modulus, result);
+    modExpMontgomery<u32, u64>(x, e, modulus, nullptr, result);
   } else {
-#if defined(__SIZEOF_INT128__)
-    modExpMontgomery<u64, unsigned __int128>(x, e, modulus, result);
-#else
-    modExpMontgomery<u32, u64>(x, e, modulus, result);
-#endif
+    modExpMontgomery(x, e, modulus, prepared, result);
   }
   wipeObject(x);
   return true;
@@ -507,6 +555,12 @@ u32 divideByWord(BigNumber& a, u32 word) noexcept {
 }
 
 }  // namespace
+
+// The modulus and its Montgomery set-up; never written after bnPrepareModulus returns.
+struct BnPreparedModulus {
+  BigNumber modulus;
+  DefaultMontgomery montgomery;
+};
 
 BigNumber bnZero() noexcept {
   BigNumber z;
@@ -682,6 +736,26 @@ void bnAllowAssemblyKernel(bool allowed) noexcept {
 #else
   (void)allowed;
 #endif
+}
+
+BnPreparedModulus* bnPrepareModulus(const BigNumber& modulus) noexcept {
+  if (modulus.count == 0 || (modulus.limbs[0] & 1u) == 0) return nullptr;
+  BnPreparedModulus* prepared = new (std::nothrow) BnPreparedModulus();
+  if (prepared == nullptr) return nullptr;
+  prepared->modulus = modulus;
+  prepared->montgomery.setUp(modulus);
+  return prepared;
+}
+
+void bnReleasePrepared(BnPreparedModulus* prepared) noexcept {
+  if (prepared == nullptr) return;
+  wipeObject(*prepared);
+  delete prepared;
+}
+
+bool bnModExpPrepared(const BigNumber& base, const BigNumber& exponent, const BnPreparedModulus& prepared,
+                      BigNumber& result) noexcept {
+  return modExp(base, exponent, prepared.modulus, result, Width::kDefault, &prepared.montgomery);
 }
 
 bool bnModExpPortable(const BigNumber& base, const BigNumber& exponent, const BigNumber& modulus,

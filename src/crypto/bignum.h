@@ -69,9 +69,19 @@ bool bnModExp(const BigNumber& base, const BigNumber& exponent, const BigNumber&
 bool bnModExpPortable(const BigNumber& base, const BigNumber& exponent, const BigNumber& modulus,
                       BigNumber& result) noexcept;
 
+// An odd modulus made ready for repeated exponentiation: its Montgomery constants and
+// R^2 mod n (one long division) computed once. Never written after it is made, so threads may
+// share one. Null for a zero or even modulus or when memory runs out; release wipes and frees.
+struct BnPreparedModulus;
+BnPreparedModulus* bnPrepareModulus(const BigNumber& modulus) noexcept;
+void bnReleasePrepared(BnPreparedModulus* prepared) noexcept;
+// bnModExp with the prepared modulus; the same result, without the per-modulus set-up.
+bool bnModExpPrepared(const BigNumber& base, const BigNumber& exponent, const BnPreparedModulus& prepared,
+                      BigNumber& result) noexcept;
+
 // On x86-64 CPUs with BMI2 and ADX the 64-bit Montgomery rows run in a small assembly kernel.
 // Tests and benchmarks pass false to force the portable C rows (the default is true), so both
-// are checked on such machines. Affects only contexts set up afterwards.
+// are checked on such machines. Affects exponentiations started afterwards.
 void bnAllowAssemblyKernel(bool allowed) noexcept;
 
 }  // namespace tessel

@@ -1,6 +1,6 @@
 // Digital envelope, RSA helpers, strength-letter wrapper and length-prefixed pair. The RSA
-// helpers share one path (block -> hex -> RSA -> optional binary/base64) and differ only in the
-// block layout and its error code. Nothing here keeps state; the random source is the only
+// helpers share one path (block -> RSA -> hex, or bytes and base64) and differ only in the
+// block layout and its error code; the byte forms skip the hex round trip. Nothing here keeps state; the random source is the only
 // thing shared with other threads.
 #include "crypto/envelope.h"
 
@@ -36,10 +36,13 @@ ErrorCode rsaOverBlock(const char* modulus, const SecureBuffer& block, ErrorCode
   return kOk;
 }
 
-ErrorCode hexToBinary(SecureBuffer* inOut) noexcept {
-  SecureBuffer binary = hexDecode(inOut->c_str());
-  if (!binary) return kErrHexToBinary;
-  *inOut = std::move(binary);
+// Padded block -> RSA -> big-endian bytes.
+ErrorCode rsaOverBlockBytes(const char* modulus, const SecureBuffer& block, ErrorCode paddingError,
+                            SecureBuffer* out) noexcept {
+  if (!block) return paddingError;
+  SecureBuffer cipher = rsaPublicBytes(modulus, block.data(), block.size());
+  if (!cipher) return kErrEncryptionFailed;
+  *out = std::move(cipher);
   return kOk;
 }
 
@@ -64,11 +67,8 @@ ErrorCode pkcs1RsaHex(const char* modulus, const std::uint8_t* m, std::size_t n,
 }
 
 ErrorCode pkcs1RsaBinary(const char* modulus, const std::uint8_t* m, std::size_t n, SecureBuffer* out) noexcept {
-  SecureBuffer value;
-  ErrorCode code = pkcs1RsaHex(modulus, m, n, &value);
-  if (code == kOk) code = hexToBinary(&value);
-  if (code == kOk) *out = std::move(value);
-  return code;
+  const SecureBuffer block = pkcs1Type2Block(m, n, rsaModulusBytes(modulus));
+  return rsaOverBlockBytes(modulus, block, kErrPkcs1Padding, out);
 }
 
 ErrorCode pkcs1RsaBase64(const char* modulus, const std::uint8_t* m, std::size_t n, SecureBuffer* out) noexcept {
@@ -86,8 +86,8 @@ ErrorCode keyouRsaHex(const char* modulus, const std::uint8_t* m, std::size_t n,
 
 ErrorCode keyouRsaBase64(const char* modulus, const std::uint8_t* m, std::size_t n, SecureBuffer* out) noexcept {
   SecureBuffer value;
-  ErrorCode code = keyouRsaHex(modulus, m, n, &value);
-  if (code == kOk) code = hexToBinary(&value);
+  const SecureBuffer block = keyouBlock(m, n, rsaModulusBytes(modulus));
+  ErrorCode code = rsaOverBlockBytes(modulus, block, kErrKeyouPadding, &value);
   if (code == kOk) code = toBase64(&value);
   if (code == kOk) *out = std::move(value);
   return code;

@@ -1,7 +1,10 @@
-// RSA public-key operation y = x^65537 mod n over hex texts.
+// RSA public-key operation y = x^65537 mod n over hex texts. The set-up of each modulus is
+// cached by its text (a few entries, process-wide, thread-safe), so repeated operations under
+// the same key skip reading the modulus and its Montgomery set-up.
 #pragma once
 
 #include <cstddef>
+#include <cstdint>
 
 #include "crypto/secure_buffer.h"
 
@@ -15,5 +18,9 @@ std::size_t rsaModulusBytes(const char* modulusHex) noexcept;
 // Absent when an argument is absent, either text is not hex, the modulus is zero or wider than
 // 2240 bits, the data is not below the modulus, or memory runs out.
 SecureBuffer rsaPublicHex(const char* modulusHex, const char* dataHex) noexcept;
+
+// The same on bytes: block holds n big-endian bytes, the result exactly k big-endian bytes.
+// Saves the hex round trip for callers that hold the block and want the ciphertext as bytes.
+SecureBuffer rsaPublicBytes(const char* modulusHex, const std::uint8_t* block, std::size_t n) noexcept;
 
 }  // namespace tessel

@@ -84,14 +84,23 @@ void compressPortable(std::uint32_t state[5], const std::uint8_t* block, std::si
 }
 
 #if defined(TESSEL_HAVE_SHA_NI)
-// Four rounds per sha1rnds4; group g of the schedule (W[4g..4g+3]) lives in msg[g % 4], lane 3
-// holding the first word. sha1nexte derives the next group's E from the A of four rounds
-// earlier; sha1msg1/sha1msg2 extend the schedule (W[t-16] ^ W[t-14], then ^ W[t-8] by hand,
-// then W[t-3] and the rotation).
-template <int F>
-__attribute__((target("sha,sse4.1,ssse3"))) inline __m128i rounds4(__m128i abcd, __m128i e) {
-  return _mm_sha1rnds4_epu32(abcd, e, F);
-}
+// Four rounds per sha1rnds4, all twenty groups written out. Group g of the schedule
+// (W[4g..4g+3], lane 3 holding the first word) lives in m[g % 4]; sha1msg1/sha1msg2 extend it
+// in place (W[t-16] ^ W[t-14], then ^ W[t-8] by hand, then W[t-3] and the rotation), and
+// sha1nexte derives each group's E from the A of four rounds earlier. The sixteen schedule
+// words, the state and its copy all stay in xmm registers: nothing of the message reaches the
+// stack, and the registers that held it are zeroed before returning.
+#define SHA1NI_LOAD(m, g) \
+  m = _mm_shuffle_epi8(_mm_loadu_si128(reinterpret_cast<const __m128i*>(block + 16 * (g))), reverseBytes)
+#define SHA1NI_EXTEND(m, m1, m2, m3) \
+  m = _mm_sha1msg2_epu32(_mm_xor_si128(_mm_sha1msg1_epu32(m, m1), m2), m3)
+#define SHA1NI_ROUNDS(f, m)             \
+  e = _mm_sha1nexte_epu32(previous, m); \
+  previous = abcd;                      \
+  abcd = _mm_sha1rnds4_epu32(abcd, e, f)
+#define SHA1NI_GROUP(f, m, m1, m2, m3) \
+  SHA1NI_EXTEND(m, m1, m2, m3);        \
+  SHA1NI_ROUNDS(f, m)
 
 __attribute__((target("sha,sse4.1,ssse3"))) void compressShaNi(std::uint32_t state[5],
                                                                const std::uint8_t* block,
@@ -99,35 +108,45 @@ __attribute__((target("sha,sse4.1,ssse3"))) void compressShaNi(std::uint32_t sta
   const __m128i reverseBytes = _mm_set_epi64x(0x0001020304050607LL, 0x08090a0b0c0d0e0fLL);
   __m128i abcd = _mm_shuffle_epi32(_mm_loadu_si128(reinterpret_cast<const __m128i*>(state)), 0x1B);
   __m128i e0 = _mm_set_epi32(static_cast<int>(state[4]), 0, 0, 0);
+  __m128i m0, m1, m2, m3, e, previous;
   for (; blocks > 0; --blocks, block += 64) {
     const __m128i abcdSaved = abcd, eSaved = e0;
-    __m128i msg[4];
-    __m128i previousAbcd = abcd;
-    for (int g = 0; g < 20; ++g) {
-      __m128i& w = msg[g & 3];
-      if (g < 4) {
-        w = _mm_shuffle_epi8(_mm_loadu_si128(reinterpret_cast<const __m128i*>(block + 16 * g)),
-                             reverseBytes);
-      } else {
-        w = _mm_sha1msg2_epu32(
-            _mm_xor_si128(_mm_sha1msg1_epu32(msg[g & 3], msg[(g + 1) & 3]), msg[(g + 2) & 3]),
-            msg[(g + 3) & 3]);
-      }
-      const __m128i e = g == 0 ? _mm_add_epi32(e0, w) : _mm_sha1nexte_epu32(previousAbcd, w);
-      previousAbcd = abcd;
-      switch (g / 5) {
-        case 0: abcd = rounds4<0>(abcd, e); break;
-        case 1: abcd = rounds4<1>(abcd, e); break;
-        case 2: abcd = rounds4<2>(abcd, e); break;
-        default: abcd = rounds4<3>(abcd, e); break;
-      }
-    }
-    e0 = _mm_sha1nexte_epu32(previousAbcd, eSaved);
+    SHA1NI_LOAD(m0, 0);
+    e = _mm_add_epi32(e0, m0);
+    previous = abcd;
+    abcd = _mm_sha1rnds4_epu32(abcd, e, 0);
+    SHA1NI_LOAD(m1, 1); SHA1NI_ROUNDS(0, m1);
+    SHA1NI_LOAD(m2, 2); SHA1NI_ROUNDS(0, m2);
+    SHA1NI_LOAD(m3, 3); SHA1NI_ROUNDS(0, m3);
+    SHA1NI_GROUP(0, m0, m1, m2, m3);
+    SHA1NI_GROUP(1, m1, m2, m3, m0);
+    SHA1NI_GROUP(1, m2, m3, m0, m1);
+    SHA1NI_GROUP(1, m3, m0, m1, m2);
+    SHA1NI_GROUP(1, m0, m1, m2, m3);
+    SHA1NI_GROUP(1, m1, m2, m3, m0);
+    SHA1NI_GROUP(2, m2, m3, m0, m1);
+    SHA1NI_GROUP(2, m3, m0, m1, m2);
+    SHA1NI_GROUP(2, m0, m1, m2, m3);
+    SHA1NI_GROUP(2, m1, m2, m3, m0);
+    SHA1NI_GROUP(2, m2, m3, m0, m1);
+    SHA1NI_GROUP(3, m3, m0, m1, m2);
+    SHA1NI_GROUP(3, m0, m1, m2, m3);
+    SHA1NI_GROUP(3, m1, m2, m3, m0);
+    SHA1NI_GROUP(3, m2, m3, m0, m1);
+    SHA1NI_GROUP(3, m3, m0, m1, m2);
+    e0 = _mm_sha1nexte_epu32(previous, eSaved);
     abcd = _mm_add_epi32(abcd, abcdSaved);
   }
   _mm_storeu_si128(reinterpret_cast<__m128i*>(state), _mm_shuffle_epi32(abcd, 0x1B));
   state[4] = static_cast<std::uint32_t>(_mm_extract_epi32(e0, 3));
+  // Clear the registers that held schedule words; the empty asm keeps the zeroing.
+  m0 = m1 = m2 = m3 = e = previous = _mm_setzero_si128();
+  __asm__ __volatile__("" : "+x"(m0), "+x"(m1), "+x"(m2), "+x"(m3), "+x"(e), "+x"(previous));
 }
+#undef SHA1NI_GROUP
+#undef SHA1NI_ROUNDS
+#undef SHA1NI_EXTEND
+#undef SHA1NI_LOAD
 
 bool cpuHasShaNi() noexcept {
   unsigned a = 0, b = 0, c = 0, d = 0;

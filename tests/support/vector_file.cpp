@@ -2,7 +2,6 @@
 // file that does not look as expected.
 #include "support/vector_file.h"
 
-#include <cctype>
 #include <fstream>
 #include <stdexcept>
 
@@ -16,12 +15,6 @@ std::string trim(const std::string& s) {
   return s.substr(b, e - b + 1);
 }
 
-std::ifstream open(const std::string& path) {
-  std::ifstream in(path);
-  if (!in) throw std::runtime_error("cannot open " + path);
-  return in;
-}
-
 }  // namespace
 
 const std::string& VectorRecord::at(const std::string& name) const {
@@ -31,7 +24,8 @@ const std::string& VectorRecord::at(const std::string& name) const {
 }
 
 std::vector<VectorRecord> readVectorRecords(const std::string& path) {
-  std::ifstream in = open(path);
+  std::ifstream in(path);
+  if (!in) throw std::runtime_error("cannot open " + path);
   std::vector<VectorRecord> records;
   std::string section, line;
   VectorRecord current;
@@ -58,33 +52,6 @@ std::vector<VectorRecord> readVectorRecords(const std::string& path) {
   }
   flush();
   return records;
-}
-
-std::vector<Pkcs1Example> readPkcs1Examples(const std::string& path) {
-  // Hex values follow "# Name:" headers and end at a blank or comment line; each example's
-  // ciphertext ("# Encryption:") comes last, after the modulus of its key and its message and seed.
-  static const std::string kExample = "# PKCS#1 v1.5 Encryption Example ";
-  std::ifstream in = open(path);
-  std::vector<Pkcs1Example> examples;
-  std::map<std::string, std::string> hex;
-  std::string line, field, name;
-  while (std::getline(in, line)) {
-    const std::string t = trim(line);
-    if (!t.empty() && t[0] != '#' && t[0] != '=') {
-      for (char c : t)
-        if (c != ' ' && !field.empty()) hex[field] += c;
-      continue;
-    }
-    if (field == "Encryption") {
-      std::string modulus = hex["Modulus"];
-      for (auto& c : modulus) c = static_cast<char>(std::toupper(static_cast<unsigned char>(c)));
-      examples.push_back({name, modulus, fromHex(hex["Message"]), fromHex(hex["Seed"]), fromHex(hex["Encryption"])});
-    }
-    field.clear();
-    if (t.rfind(kExample, 0) == 0) name = t.substr(kExample.size());
-    if (t.size() > 3 && t[0] == '#' && t.back() == ':') hex[field = t.substr(2, t.size() - 3)].clear();
-  }
-  return examples;
 }
 
 }  // namespace tessel::test

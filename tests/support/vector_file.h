@@ -21,12 +21,4 @@ struct VectorRecord {
 // Records are separated by blank lines; "#" lines are comments. Throws if the file is missing.
 std::vector<VectorRecord> readVectorRecords(const std::string& path);
 
-// One PKCS#1 v1.5 encryption example of pkcs1v15crypt-vectors.txt.
-struct Pkcs1Example {
-  std::string name;          // "1.1" ... "15.20"
-  std::string modulusHex;    // upper case
-  Bytes message, seed, ciphertext;
-};
-std::vector<Pkcs1Example> readPkcs1Examples(const std::string& path);
-
 }  // namespace tessel::test
