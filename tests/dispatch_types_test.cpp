@@ -56,18 +56,15 @@ class DispatchTypes : public ::testing::Test {
     return test::dispatch(type, app_.c_str(), enc_.c_str(), text.c_str(), timestamp);
   }
   // Dispatches with both keys and a timestamp and opens the result on the server side.
-  static bool open(int type, const std::string& text, server::Opened* opened, std::string* error) {
+  static server::Opened roundTrip(int type, const std::string& text) {
     const Dispatched d = dispatch(type, text);
     EXPECT_EQ(d.code, 0) << "type " << type << " text '" << text << "'";
     server::OpenKeys keys;
     keys.app = &appKey();
     keys.enc = &encKey();
-    return server::openOutput(type, d.output, keys, opened, error);
-  }
-  static server::Opened roundTrip(int type, const std::string& text) {
     server::Opened opened;
     std::string error;
-    EXPECT_TRUE(open(type, text, &opened, &error)) << "type " << type << ": " << error;
+    EXPECT_TRUE(server::openOutput(type, d.output, keys, &opened, &error)) << "type " << type << ": " << error;
     return opened;
   }
   static std::string app_, enc_;
