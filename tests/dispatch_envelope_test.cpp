@@ -167,22 +167,5 @@ TEST(RandomSource, SystemCallFailuresGiveError9AndNeverAPartKey) {
   EXPECT_NE(a, Bytes(64, 0));
 }
 
-TEST(DispatchHelpers, LengthPrefixedPairAndWrapper) {
-  // The fixed buffer's bound (127 characters) is checked through the types that use it, in
-  // dispatch_types_test; here the layout, with "%02d" widening to three digits from 100 on.
-  const std::string text100(100, 'x');
-  SecureBuffer out;
-  EXPECT_EQ(lengthPrefixedPair("1700", "pw", true, &out), 0);
-  EXPECT_EQ(text(out), "04170002pw");
-  EXPECT_EQ(lengthPrefixedPair("", "", true, &out), 0);
-  EXPECT_EQ(text(out), "0000");
-  EXPECT_EQ(lengthPrefixedPair("1", text100.c_str(), false, &out), 0);
-  EXPECT_EQ(text(out), "011100" + text100);
-  EXPECT_EQ(payloadWrapper('M', "1700", "a:b", &out), 0);
-  EXPECT_EQ(text(out), "M1700:a:b");
-  EXPECT_EQ(payloadWrapper('E', "", "", &out), 0);
-  EXPECT_EQ(text(out), "E:");
-}
-
 }  // namespace
 }  // namespace tessel::test

@@ -187,9 +187,8 @@ void opensslMd5(const void* data, std::size_t n, unsigned char out[16]) {
 }
 
 // The needles: a prefix of the password (catches partial copies made while typing too), its
-// upper-case hex form (what a hex-encoded padded block would show), MD5(password) binary and
-// hex, and the salted value MD5(md5hex || salt): binary, the 16 hex digits every mode keeps,
-// and their upper-case hex form.
+// upper-case hex form (what a hex-encoded padded block would show), MD5(password) as hex, and
+// the 16 hex digits of the salted value MD5(md5hex || salt) that every mode keeps.
 void buildNeedles() {
   g_needleCount.store(0);
   addNeedle("password (first 8 characters)", kPassword, 8);
@@ -199,7 +198,6 @@ void buildNeedles() {
 
   unsigned char md5[16];
   opensslMd5(kPassword, kPasswordLength, md5);
-  addNeedle("MD5(password), binary", md5, 16);
   lowerHex(md5, 16, g_md5Hex);
   g_md5Hex[32] = 0;
   addNeedle("MD5(password), lower-case hex", g_md5Hex, 32);
@@ -209,12 +207,9 @@ void buildNeedles() {
   std::memcpy(salted + 32, kSalt, sizeof kSalt - 1);
   unsigned char md5Salted[16];
   opensslMd5(salted, 32 + sizeof kSalt - 1, md5Salted);
-  addNeedle("MD5(md5hex || salt), binary", md5Salted, 16);
   char saltedHex[32];
   lowerHex(md5Salted, 16, saltedHex);
   addNeedle("MD5(md5hex || salt), hex digits 8..24", saltedHex + 8, 16);
-  upperHex(reinterpret_cast<const unsigned char*>(saltedHex + 8), 16, hex);
-  addNeedle("MD5(md5hex || salt), digits 8..24 as upper-case hex", hex, 32);
 }
 
 // Arms the free() scan for the lifetime of the object; reports every hit on disarm.
@@ -246,31 +241,13 @@ class ScanScope {
   long scannedBefore_;
 };
 
-// RC4 under the seal key, written out here rather than taken from the library.
-void sealKeystream(unsigned char* out, std::size_t n) {
-  static const unsigned char kKey[] = "QN-Tesselate";
-  unsigned char s[256];
-  for (int i = 0; i < 256; ++i) s[i] = static_cast<unsigned char>(i);
-  for (int i = 0, j = 0; i < 256; ++i) {
-    j = (j + s[i] + kKey[i % 12]) & 255;
-    std::swap(s[i], s[j]);
-  }
-  for (std::size_t k = 0, i = 0, j = 0; k < n; ++k) {
-    i = (i + 1) & 255;
-    j = (j + s[i]) & 255;
-    std::swap(s[i], s[j]);
-    out[k] = s[(s[i] + s[j]) & 255];
-  }
-}
-
 // Between operations: exactly `length` sealed bytes (RC4 of the typed prefix), zeros after them,
 // no plaintext anywhere in either 4093-byte area.
 void expectSealed(const KeyboardSession& s, std::size_t length, const char* after) {
   SCOPED_TRACE(after);
   const ContentStore& store = *s.content;
   ASSERT_EQ(store.length.load(), length);
-  unsigned char keystream[kContentBufferSize];
-  sealKeystream(keystream, length);
+  const Bytes keystream = opensslRc4(bytesOf("QN-Tesselate"), Bytes(length, 0));
   std::size_t mismatches = 0, nonZeroTail = 0;
   for (std::size_t i = 0; i < length; ++i) {
     if (store.plaintext[i] != static_cast<unsigned char>(kPassword[i] ^ keystream[i])) ++mismatches;
