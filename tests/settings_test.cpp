@@ -76,9 +76,6 @@ const NumberCase kNumberCases[] = {
     {"finishMode", setFinishMode, [](auto& s) { return s.finishMode.load(); }, {{1, 1}, {2, 0}}},
     {"mode", setMode, [](auto& s) { return s.mode; },
      {{kRead, 1}, {2, 1}, {0, 0}, {4, 4}, {3, 4}, {-4, 4}, {static_cast<std::int16_t>(0x8001), 4}, {1, 1}}},
-    {"encryptType", [](auto& s, std::int16_t v) { setEncryptType(s, static_cast<std::int8_t>(v)); },
-     [](auto& s) { return s.encryptType; }, {{-1, 255}}},
-    {"contentType", setContentType, [](auto& s) { return s.content->contentType; }, {{-1, 0xFFFFFFFFLL}}},
 };
 
 TEST_F(SettingsTest, NumericSettersValidateAndStore) {
@@ -101,8 +98,6 @@ struct TextCase {
 };
 
 const char* hashSuffix(const KeyboardSession& s) { return s.content->hashRandomSuffix; }
-const char* factor(const KeyboardSession& s) { return s.content->kbdFactor; }
-const char* algorithm(const KeyboardSession& s) { return s.content->algorithmCode; }
 const char* challenge(const KeyboardSession& s) { return s.content->challengeCode; }
 const char* dictionary(const KeyboardSession& s) { return s.content->dictionaryFilter; }
 const char* accepts(const KeyboardSession& s) { return s.accepts; }
@@ -118,14 +113,6 @@ const TextCase kTextCases[] = {
     {"hashRandomTooShort", [](auto& s) { setHashRandom(s, "1:"); }, hashSuffix, nullptr},
     {"hashRandomKeepsOld", [](auto& s) { setHashRandom(s, "1:abc"); setHashRandom(s, "9:zz"); }, hashSuffix, "::::::::::abc::::::::::S"},
     {"hashRandomReplaces", [](auto& s) { setHashRandom(s, "1:abc"); setHashRandom(s, "2:de"); }, hashSuffix, "::::::::::de::::::::::F"},
-    {"factorKind2", [](auto& s) { setKbdFactor(s, "2xyz"); }, factor, "xyz"},
-    {"factorAnyOtherFirst", [](auto& s) { setKbdFactor(s, "x"); }, factor, ""},
-    {"factorKind0KeepsBuffer", [](auto& s) { setKbdFactor(s, "2xyz"); setKbdFactor(s, "0"); }, factor, "xyz"},
-    {"factorKind1", [](auto& s) { setKbdFactor(s, "1abc"); }, factor, nullptr},
-    {"factorEmpty", [](auto& s) { setKbdFactor(s, "2ab"); setKbdFactor(s, ""); setKbdFactor(s, nullptr); }, factor, "ab"},
-    {"algorithmDefault", [](auto&) {}, algorithm, "000"},
-    {"algorithmEmptyKeeps", [](auto& s) { setAlgorithmCode(s, ""); setAlgorithmCode(s, nullptr); }, algorithm, "000"},
-    {"algorithm", [](auto& s) { setAlgorithmCode(s, "123"); }, algorithm, "123"},
     {"challenge", [](auto& s) { setChallengeCode(s, "C0DE"); }, challenge, "C0DE"},
     {"challengeEmptyKeeps", [](auto& s) { setChallengeCode(s, "C0DE"); setChallengeCode(s, ""); }, challenge, "C0DE"},
     {"dictionaryEmpty", [](auto& s) { setDictionaryFilter(s, "pw"); setDictionaryFilter(s, ""); }, dictionary, ""},
@@ -156,18 +143,6 @@ TEST_F(SettingsTest, TextSettersValidateAndStore) {
       EXPECT_STREQ(got, c.expected);
     }
   }
-}
-
-TEST_F(SettingsTest, KeyboardFactorKinds) {
-  const struct {
-    const char* text;
-    int kind;
-  } steps[] = {{"2xyz", 2}, {"0", 0}, {"1", 1}, {"", 1}, {"7q", 2}};
-  for (const auto& step : steps) {
-    setKbdFactor(*s_, step.text);
-    EXPECT_EQ(s_->content->kbdFactorKind, step.kind) << step.text;
-  }
-  EXPECT_STREQ(s_->content->kbdFactor, "q");
 }
 
 TEST_F(SettingsTest, BlobAndEccReturnCodes) {
