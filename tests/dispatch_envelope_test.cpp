@@ -3,6 +3,8 @@
 // of the expected padded block, RC4 after the type's drop, the SIMPLEBLOB layout, base64).
 #include <gtest/gtest.h>
 
+#include <algorithm>
+#include <cerrno>
 #include <string>
 #include <vector>
 
@@ -100,21 +102,69 @@ TEST_F(KnownRandom, RsaHelpersMatchOpenSslRawRsa) {
   EXPECT_EQ(text(out), opensslBase64(keyou()));
 }
 
-TEST(DispatchHelpers, LengthPrefixedPairAndWrapper) {
-  // The fixed buffer's bound (127 characters) is checked through the types that use it, in
-  // dispatch_types_test; here the layout, with "%02d" widening to three digits from 100 on.
-  const std::string text100(100, 'x');
-  SecureBuffer out;
-  EXPECT_EQ(lengthPrefixedPair("1700", "pw", true, &out), 0);
-  EXPECT_EQ(text(out), "04170002pw");
-  EXPECT_EQ(lengthPrefixedPair("", "", true, &out), 0);
-  EXPECT_EQ(text(out), "0000");
-  EXPECT_EQ(lengthPrefixedPair("1", text100.c_str(), false, &out), 0);
-  EXPECT_EQ(text(out), "011100" + text100);
-  EXPECT_EQ(payloadWrapper('M', "1700", "a:b", &out), 0);
-  EXPECT_EQ(text(out), "M1700:a:b");
-  EXPECT_EQ(payloadWrapper('E', "", "", &out), 0);
-  EXPECT_EQ(text(out), "E:");
+// ---- the system source, its calls faked: each read gives at most the count its script names
+// (-1: fails with errno, 0: end of file), from the byte sequence 1, 2, 3, ...
+struct FakeOs {
+  int openResult = 7;
+  std::vector<int> reads;
+  std::vector<int> errnos;
+  std::size_t call = 0;
+  int closes = 0;
+  std::uint8_t next = 1;
+} gOs;
+const RandomSystemCalls kFakeCalls{
+    +[](const char* path, int) { return std::string(path) == "/dev/urandom" ? gOs.openResult : -1; },
+    +[](int fd, void* buffer, std::size_t n) -> ssize_t {
+      EXPECT_EQ(fd, gOs.openResult);
+      if (gOs.call >= gOs.reads.size()) return 0;
+      const int script = gOs.reads[gOs.call];
+      errno = gOs.call < gOs.errnos.size() ? gOs.errnos[gOs.call] : EIO;
+      ++gOs.call;
+      if (script < 0) return -1;
+      const std::size_t k = std::min(n, static_cast<std::size_t>(script));
+      for (std::size_t i = 0; i < k; ++i) static_cast<std::uint8_t*>(buffer)[i] = gOs.next++;
+      return static_cast<ssize_t>(k);
+    },
+    +[](int) { return ++gOs.closes, 0; }};
+
+TEST(RandomSource, SystemCallFailuresGiveError9AndNeverAPartKey) {
+  Bytes counting(16);
+  for (std::size_t i = 0; i < 16; ++i) counting[i] = static_cast<std::uint8_t>(i + 1);
+  const struct {
+    const char* name;
+    int open;
+    std::vector<int> reads, errnos;
+    bool ok;
+  } cases[] = {
+      {"open fails", -1, {16}, {}, false},
+      {"read fails", 7, {-1}, {EIO}, false},
+      {"interrupted, then read", 7, {-1, 16}, {EINTR}, true},
+      {"short reads are completed", 7, {5, 5, 1, 100}, {}, true},
+      {"end of file before the request is full", 7, {5, 0}, {}, false},
+  };
+  const std::string modulus = appKey().modulusHex(), encModulus = encKey().modulusHex();
+  const char* const keys[2] = {modulus.c_str(), encModulus.c_str()};
+  setRandomSystemCallsForTesting(&kFakeCalls);
+  for (const auto& c : cases) {
+    // randomBytes itself; on failure also the envelope key (type 0) and the triple-DES key (38).
+    for (int type : c.ok ? std::vector<int>{-1} : std::vector<int>{-1, 0, 38}) {
+      gOs = FakeOs{c.open, c.reads, c.errnos};
+      Bytes key(16, 0xEE);
+      SecureBuffer out;
+      const int code = type < 0 ? (randomBytes(key.data(), key.size()) ? 0 : 9)
+                                : encryptionDispatch(type, keys, &out, "1234", "1700000000");
+      EXPECT_EQ(code, c.ok ? 0 : 9) << c.name << ", type " << type;
+      EXPECT_FALSE(out) << c.name;
+      if (type < 0 && c.ok) { EXPECT_EQ(key, counting) << c.name; }
+      EXPECT_EQ(gOs.closes, c.open < 0 ? 0 : 1) << c.name << ", type " << type;
+    }
+  }
+  setRandomSystemCallsForTesting(nullptr);
+  // The real device: two requests differ and are not all zero.
+  Bytes a(64), b(64);
+  ASSERT_TRUE(randomBytes(a.data(), a.size()) && randomBytes(b.data(), b.size()));
+  EXPECT_NE(a, b);
+  EXPECT_NE(a, Bytes(64, 0));
 }
 
 }  // namespace
