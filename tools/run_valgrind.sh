@@ -4,9 +4,9 @@
 #   valgrind --error-exitcode=1 --leak-check=full --errors-for-leak-kinds=definite
 #            --suppressions=tests/valgrind.supp
 # so any invalid access, use of uninitialised memory, bad free or definite leak fails the run.
-# The only leaks tests/valgrind.supp allows from the library are the three strings that
-# destroySession deliberately keeps; the rest of that file covers the test oracles' own
-# process-lifetime allocations (OpenSSL, Mesa/EGL) and one glibc loader false positive.
+# tests/valgrind.supp allows no leak from the library (the suites free the three strings that
+# destroySession deliberately keeps); it covers only the test oracles' own process-lifetime
+# allocations (OpenSSL, Mesa/EGL) and one glibc loader false positive.
 #
 #   bash tools/run_valgrind.sh              # every unit suite, TESSEL_JOBS (default 2) at a time
 #   bash tools/run_valgrind.sh codec_test   # only the named suites
