@@ -626,9 +626,17 @@ class Matcher {
     const std::int32_t from = d[0], to = d[1];
     const bool inside = from >= 0 && (dir_ > 0 ? from <= pos && pos <= to : to <= pos && pos <= from);
     if (!inside) {
+      // Scanning up to a run already measured takes its end: a visit right before the last
+      // one costs one byte, not the whole run.
       std::int32_t k = 0;
       const std::int32_t room = avail(pos);
-      while (k < room && set.has(at(pos + dir_ * k))) ++k;
+      while (k < room && set.has(at(pos + dir_ * k))) {
+        ++k;
+        if (pos + dir_ * k == from) {
+          k += (to - from) * dir_;
+          break;
+        }
+      }
       d[0] = pos;
       d[1] = pos + dir_ * k;
     }
