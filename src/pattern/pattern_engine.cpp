@@ -617,7 +617,7 @@ class Matcher {
   std::int32_t* star(const PatternInst& in) { return stars_.data() + 5 * static_cast<std::size_t>(in.memo); }
   std::int32_t runLength(const PatternInst& in, std::int32_t pos, std::int32_t limit) {
     const ByteSet& set = sets_[in.a];
-    if (in.memo < 0) {
+    if (in.memo < 0 || in.c != PatternEngine::kUnbounded) {  // a bounded run: scan only what counts
       std::int32_t k = 0;
       while (k < limit && set.has(at(pos + dir_ * k))) ++k;
       return k;
