@@ -51,10 +51,10 @@ TEST(PatternMatch, Table) {
       {"[a-z]{6,}", "abcde", false},    {"[a-z]{6,}", "abcdefghij", true},
       {"[[:alpha:][:digit:][:punct:]]{0,16}", "Abc1!xyz", true},
       {"[[:alpha:][:digit:][:punct:]]{0,16}", "aaaaaaaaaaaaaaaaa", false},  // 17
-      {"[[:^digit:]x]+", "ax!", true},  {"[^a-c]+", "xaz", false},      {"[a-]+", "a-a", true},
+      {"[[:^digit:]x]+", "ax!", true},  {"[^a-c]+", "xaz", false},      {"[a-]+", "a-a", true}, {"[b-b]", "b", true},
       {"[]+", "a", false},              {"[^]+", "\x01\xFF", true},      {".+", "a\nb", true},
       {"a{3}?", "aaa", true},           {"a{3}+", "aaa", true},          {"a{3,1}", "aaa", true},
-      {"a{3,1}", "aa", false},          {"a{0}b", "b", true},            {"a{0,0}+", "", true},
+      {"a{3,1}", "aa", false}, {"a{3,1}", "aaaa", false}, {"a{0}b", "b", true}, {"a{0,0}+", "", true},
       {"a*+a", "aaa", false},           {"(a|ab)*+c", "ababc", false},   {"(ab|a)*+c", "ababc", true},
       {"(a|ab)*+b", "ab", true},        {"a+?b", "aaab", true},          {"\\d\\D\\s\\S\\w\\W", "1a b_!", true},
       {"\\Qa.b*\\E", "a.b*", true},     {"\\Qa.b*\\E", "axbb", false},   {"\\LAB\\EC", "abC", true},
