@@ -58,7 +58,7 @@ TEST(PatternMatch, Table) {
       {"a*+a", "aaa", false},           {"(a|ab)*+c", "ababc", false},   {"(ab|a)*+c", "ababc", true},
       {"(a|ab)*+b", "ab", true},        {"a+?b", "aaab", true},          {"\\d\\D\\s\\S\\w\\W", "1a b_!", true},
       {"\\Qa.b*\\E", "a.b*", true},     {"\\Qa.b*\\E", "axbb", false},   {"\\LAB\\EC", "abC", true},
-      {"\\UaB\\Ec", "ABc", true},       {"\\x41\\x{42}\\u0043", "ABC", true},
+      {"\\UaB\\Ec", "ABc", true},       {"\\x41\\x{42}\\u0043", "ABC", true}, {"\\Q.\\E.", ".x", true},
       {"\\t\\n\\r\\f\\v\\a\\e", "\t\n\r\f\v\a\x1B", true},           {"\\*\\+\\?\\.\\[\\(", "*+?.[(", true},
       {"]", "]", true},                 {"a-b", "a-b", true},            {"(?#note)a(?#more)b", "ab", true},
       {"(a)(b)\\g2\\g1", "abba", true}, {"(a)(b)\\g{-1}\\k<1>", "abba", true},  {"(a)\\k{1}", "ab", false},
@@ -110,7 +110,8 @@ TEST(PatternBackrefs, EmptyIterationsKeepTheirCaptures) {
 // The whole-text match gives up when the second or a later way and the next both end at the start.
 TEST(PatternMatch, NoProgressRuleHoldsAtPatternEnd) {
   const Row rows[] = {{"(||)b*|a", "a", false}, {"(||)b*(){0}|a", "a", false}, {"(a*?|)(|)", "a", true},
-                      {"(a*?|)(||)", "a", false}, {"(a*?|)(||)", "", true},     {"(|)b*|a", "a", true}};
+                      {"(a*?|)(||)", "a", false}, {"(a*?|)(||)", "", true}, {"(|)b*|a", "a", true},
+                      {"(||)a*|aab", "aab", true}, {"(||)(a|)*|aab", "aab", false}};
   expectRows(rows);
 }
 
@@ -206,11 +207,10 @@ TEST(PatternLongText, BackrefSearchIsBounded) {
 namespace {
 
 void* runOnSmallStack(void* allMatched) {
-  const std::string digits(4092, '7'), mixed = std::string(2046, 'a') + std::string(2046, '1');
+  const std::string digits(4092, '7'), mixed = std::string(2046, 'a') + std::string(2046, '1'), as(4092, 'a');
   const std::string deep = std::string(2000, '(') + "a|b" + std::string(2000, ')');
   std::string deepLoops = "b";  // 33 nested loops
   for (int i = 0; i < 33; ++i) deepLoops = "(a|" + deepLoops + ")*";
-  const std::string as(4092, 'a');
   const Row rows[] = {{"[:alnum:]+", digits, true}, {"[:print:]*[:digit:]+[:print:]*", mixed, true},
                       {"(a|1)+?", mixed, true},     {"(([:alpha:])|([:digit:]))*", mixed, true},
                       {"(7|77)*8", digits, false},  {deep.c_str(), "b", true}, {deepLoops.c_str(), as, true}};
