@@ -613,34 +613,46 @@ class Matcher {
     r[k] = f.pos == start_ ? static_cast<std::uint8_t>(tracker_ + 1) : (ways_ != f.ways ? 2 : 1);
   }
 
-  // kStar bookkeeping, 5 ints per memo point: run start, run end, failed ends lo..hi, emitted.
-  std::int32_t* star(const PatternInst& in) { return stars_.data() + 5 * static_cast<std::size_t>(in.memo); }
+  // kStar bookkeeping, 6 ints per memo point: run start and end, failed ends lo..hi, emitted,
+  // run complete.
+  std::int32_t* star(const PatternInst& in) { return stars_.data() + 6 * static_cast<std::size_t>(in.memo); }
+  // Members of the star's set from `pos` on, at most `limit`. Each branching star keeps the run
+  // it measured last ([from, to), `to` its true end when complete) and extends it on demand, so
+  // the visits of one run scan each byte once.
   std::int32_t runLength(const PatternInst& in, std::int32_t pos, std::int32_t limit) {
     const ByteSet& set = sets_[in.a];
-    if (in.memo < 0 || in.c != PatternEngine::kUnbounded) {  // a bounded run: scan only what counts
+    const std::int32_t room = avail(pos);
+    if (in.memo < 0) {
       std::int32_t k = 0;
       while (k < limit && set.has(at(pos + dir_ * k))) ++k;
       return k;
     }
     std::int32_t* d = star(in);
-    const std::int32_t from = d[0], to = d[1];
-    const bool inside = from >= 0 && (dir_ > 0 ? from <= pos && pos <= to : to <= pos && pos <= from);
+    const bool inside = d[0] >= 0 && (dir_ > 0 ? d[0] <= pos && pos <= d[1] : d[1] <= pos && pos <= d[0]);
     if (!inside) {
-      // Scanning up to a run already measured takes its end: a visit right before the last
-      // one costs one byte, not the whole run.
+      // Scanning up to the run measured before joins it: a visit right before the last one
+      // costs one byte, not the whole run.
+      const std::int32_t oldFrom = d[0], oldTo = d[1], oldComplete = d[5];
       std::int32_t k = 0;
-      const std::int32_t room = avail(pos);
-      while (k < room && set.has(at(pos + dir_ * k))) {
+      bool joined = false;
+      while (k < limit && k < room && set.has(at(pos + dir_ * k))) {
         ++k;
-        if (pos + dir_ * k == from) {
-          k += (to - from) * dir_;
+        if (oldFrom >= 0 && pos + dir_ * k == oldFrom) {
+          joined = true;
           break;
         }
       }
       d[0] = pos;
-      d[1] = pos + dir_ * k;
+      d[1] = joined ? oldTo : pos + dir_ * k;
+      d[5] = joined ? oldComplete : (k < limit ? 1 : 0);
+      if (!joined) return k;
     }
-    return std::min(limit, (d[1] - pos) * dir_);
+    std::int32_t k = (d[1] - pos) * dir_;
+    if (k >= limit || d[5] != 0) return std::min(k, limit);
+    while (k < limit && k < room && set.has(at(pos + dir_ * k))) ++k;
+    d[1] = pos + dir_ * k;
+    d[5] = k < limit ? 1 : 0;
+    return k;
   }
   void starEndFailed(const PatternInst& in, std::int32_t end, bool emitted) {
     std::int32_t* d = star(in);
@@ -921,8 +933,8 @@ bool PatternEngine::run(MatchContext& c, const std::uint8_t* text, std::size_t l
     c.stack_.clear();
     c.slots_.assign(3 * (static_cast<std::size_t>(groups_) + 1), -1);
     c.memoRows_.assign(static_cast<std::size_t>(memoPoints_), nullptr);
-    c.starData_.resize(5 * static_cast<std::size_t>(memoPoints_));
-    for (std::size_t i = 0; i < c.starData_.size(); i += 5) {
+    c.starData_.resize(6 * static_cast<std::size_t>(memoPoints_));
+    for (std::size_t i = 0; i < c.starData_.size(); i += 6) {
       c.starData_[i] = -1;  // no run scanned
       c.starData_[i + 2] = 1;  // no failed ends
       c.starData_[i + 3] = 0;
