@@ -9,8 +9,15 @@
 // "{0,16}" pattern fails, as it would for the user's seventeenth key. After the runs a table
 // prints our CPU time and the peer/ours ratios per case (above 1 means we are faster).
 // Targets: std::regex/ours >= 5 and PCRE2/ours >= 1 up to length 64.
+//
+// Hostile key presses: patterns that make a backtracking search explode, each on a
+// 4092-byte text that matches, one that does not, and one that does not although it holds
+// the byte the pattern requires (so no quick scan can refuse it). Target: at most 1 ms per
+// key press for ours; the "peak_bytes" counter is the match state's heap at its largest.
+// PCRE2 runs the same compile and match with its default limits (a hit counts as "limit").
 #include <benchmark/benchmark.h>
 
+#include <algorithm>
 #include <cstdio>
 #include <map>
 #include <random>
@@ -19,6 +26,7 @@
 #include <vector>
 
 #include "pattern/match.h"
+#include "pattern/pattern_engine.h"
 #include "pattern/strength.h"
 
 #if defined(TESSEL_HAVE_PCRE2)
@@ -93,6 +101,82 @@ void BM_Pcre2(benchmark::State& state, const AcceptsCase* c, int length) {
 }
 #endif
 
+struct HostileCase {
+  const char* name;
+  const char* pattern;
+  char last;  // the byte a matching text ends with
+};
+
+const HostileCase kHostile[] = {
+    {"(a*)*b", "(a*)*b", 'b'},
+    {"(a|aa)*c", "(a|aa)*c", 'c'},
+    {"((a+)*)+b", "((a+)*)+b", 'b'},
+    {"(.*){20}x", "(.*){20}x", 'x'},
+    {"(a{0,1000}){0,1000}b", "(a{0,1000}){0,1000}b", 'b'},
+    {"(a*)*b|a*", "(a*)*b|a*", 'b'},
+    {"(q*)*x4|.*", "(q*)*(q*)*(q*)*(q*)*z|.*", 'z'},
+    {"digit+alpha+punct", "[:print:]*[:digit:][:print:]*[:alpha:][:print:]*[:punct:][:print:]*", '!'},
+    {"digit+alpha", "[:print:]*[:digit:][:print:]*[:alpha:][:print:]*", 'a'},
+};
+const char* const kHostileTexts[] = {"match", "nomatch", "nomatch_required"};
+
+std::string hostileText(const HostileCase& c, int kind) {
+  const std::size_t n = 4092;
+  if (c.last == '!' || c.last == 'a') {  // the "contains" rules: digit, then letter, then punctuation
+    std::string s(n, 'k');
+    s[0] = '7';
+    if (kind == 1) s[0] = 'k';  // no digit at all
+    if (kind == 2) s.back() = '7';  // classes present, punctuation or letter only before the digit
+    if (kind == 2) s[0] = c.last == '!' ? '!' : 'k';
+    if (kind == 0) s.back() = c.last;
+    return s;
+  }
+  if (kind == 0) return std::string(n - 1, 'a') + c.last;
+  if (kind == 1) return std::string(n, 'a');
+  return std::string(n / 2, 'a') + c.last + std::string(n - n / 2 - 1, 'a');
+}
+
+void BM_HostileOurs(benchmark::State& state, const HostileCase* c, int kind) {
+  const std::string text = hostileText(*c, kind);
+  bool matched = false;
+  std::size_t peak = 0;
+  for (auto _ : state) {
+    const tessel::PatternEngine engine(c->pattern);
+    tessel::MatchContext context;
+    matched = engine.matches(reinterpret_cast<const std::uint8_t*>(text.data()), text.size(), &context);
+    peak = std::max(peak, context.peakBytes());
+    benchmark::DoNotOptimize(matched);
+  }
+  state.counters["matched"] = matched;
+  state.counters["peak_bytes"] = static_cast<double>(peak);
+}
+
+#if defined(TESSEL_HAVE_PCRE2)
+void BM_HostilePcre2(benchmark::State& state, const HostileCase* c, int kind) {
+  const std::string text = hostileText(*c, kind);
+  int rc = 0;
+  for (auto _ : state) {
+    int error = 0;
+    PCRE2_SIZE offset = 0;
+    std::string peer = c->pattern;
+    for (const char* name : {"print", "digit", "alpha", "punct"}) {
+      const std::string from = std::string("[:") + name + ":]", to = "[" + from + "]";
+      for (std::size_t at = peer.find(from); at != std::string::npos; at = peer.find(from, at + to.size()))
+        peer.replace(at, from.size(), to);
+    }
+    pcre2_code* code = pcre2_compile(reinterpret_cast<PCRE2_SPTR>(peer.c_str()), PCRE2_ZERO_TERMINATED,
+                                     PCRE2_ANCHORED | PCRE2_ENDANCHORED | PCRE2_DOTALL, &error, &offset, nullptr);
+    pcre2_match_data* data = pcre2_match_data_create_from_pattern(code, nullptr);
+    rc = pcre2_match(code, reinterpret_cast<PCRE2_SPTR>(text.data()), text.size(), 0, 0, data, nullptr);
+    pcre2_match_data_free(data);
+    pcre2_code_free(code);
+    benchmark::DoNotOptimize(rc);
+  }
+  state.counters["matched"] = rc >= 0;
+  state.counters["limit"] = rc < 0 && rc != PCRE2_ERROR_NOMATCH;
+}
+#endif
+
 void BM_RateStrength48(benchmark::State& state) {
   const char* password = "Tr0ub4dor&3xK9q!";  // 16 characters, all three classes
   char letter = 0;
@@ -127,6 +211,17 @@ class RatioReporter : public benchmark::ConsoleReporter {
       }
     }
     std::printf("rateStrength(48, 16 characters): %.1f ns CPU\n", lookup("rateStrength48/16"));
+    std::printf("\n%-22s %-17s %14s %14s\n", "hostile, 4092 bytes", "text", "ours CPU ms", "PCRE2/ours");
+    double worst = 0;
+    for (const HostileCase& c : kHostile) {
+      for (const char* kind : kHostileTexts) {
+        const std::string suffix = std::string("/") + c.name + "/" + kind;
+        const double ours = lookup("hostile_ours" + suffix), pcre = lookup("hostile_pcre2" + suffix);
+        worst = std::max(worst, ours);
+        std::printf("%-22s %-17s %14.4f %13.1fx\n", c.name, kind, ours / 1e6, pcre > 0 ? pcre / ours : 0.0);
+      }
+    }
+    std::printf("worst hostile key press: %.4f ms CPU\n", worst / 1e6);
   }
 
  private:
@@ -151,6 +246,15 @@ int main(int argc, char** argv) {
     }
   }
   benchmark::RegisterBenchmark("rateStrength48/16", BM_RateStrength48);
+  for (const HostileCase& c : kHostile) {
+    for (int kind = 0; kind < 3; ++kind) {
+      const std::string suffix = std::string("/") + c.name + "/" + kHostileTexts[kind];
+      benchmark::RegisterBenchmark(("hostile_ours" + suffix).c_str(), BM_HostileOurs, &c, kind);
+#if defined(TESSEL_HAVE_PCRE2)
+      benchmark::RegisterBenchmark(("hostile_pcre2" + suffix).c_str(), BM_HostilePcre2, &c, kind);
+#endif
+    }
+  }
   benchmark::Initialize(&argc, argv);
   RatioReporter reporter;
   benchmark::RunSpecifiedBenchmarks(&reporter);

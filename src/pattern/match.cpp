@@ -1,7 +1,6 @@
 // wholeMatch: compile-and-match in one call, for the key-press accepts check.
 //
-// The engine and its match context both live on this frame; for everyday patterns neither
-// touches the heap (the arena and the stacks have inline room).
+// The engine and its match context both live on this frame and are freed on return.
 #include "pattern/match.h"
 
 #include "pattern/pattern_engine.h"

@@ -174,10 +174,6 @@ class Lexer {
       default:
         break;
     }
-    if (e >= '1' && e <= '9') {
-      if (inSet) return false;
-      return out_.push(Token{TokenKind::kBackref, 0, false, e - '0'});
-    }
     return byte(static_cast<std::uint8_t>(e));
   }
 

@@ -3,7 +3,8 @@
 // Turns a pattern text into tokens: a plain byte, a special byte (context dependent: outside a
 // bracket expression $ ( ) * + . ? [ ^ { | } are special; inside one only ']', '-' and a
 // leading '^'), a class (a "[:name:]" / "[:^name:]" written anywhere, or \d \D \s \S \w \W),
-// an assertion (\A \Z \z \b \B \G), or a back-reference (\g \k and \1..\9). Comments "(?#...)"
+// an assertion (\A \Z \z \b \B \G), or a back-reference (\g and \k only:
+// an escaped digit stands for itself, so "a\1" matches "a1"). Comments "(?#...)"
 // produce nothing; with the extended flag, white space and '#' comments outside brackets are
 // skipped. \Q...\E is literal mode; \L and \U lower/upper-case the following literal bytes
 // until \E. The bracket depth is tracked here so the parser never sees a '[' inside a set as
@@ -11,7 +12,7 @@
 //
 // Decisions where the syntax leaves room (documented in pattern_engine.h): a backslash also
 // escapes inside a bracket expression; \x takes up to two hex digits (none means NUL) or
-// {hex} up to 0xFF; \u takes one to four hex digits up to 0xFF; \0 stands for '0'. Anything
+// {hex} up to 0xFF; \u takes one to four hex digits up to 0xFF; \0..\9 stand for the digit. Anything
 // the lexer cannot read (unknown class name, unterminated "[:", "(?#" or \x{, trailing
 // backslash, \A-style assertions or back-references inside a set) makes the whole pattern
 // malformed.
