@@ -287,6 +287,122 @@ inline std::uint64_t mulAddRowAdx(std::uint64_t* t, const std::uint64_t* a, int 
   return hi;
 }
 
+// The whole Montgomery reduction of t[0..2n) on BMI2/ADX, for n a multiple of four (n >= 8):
+// n rows t[i..i+n) += m_i * mod, m_i = t[i] * n0. What bounds short moduli is the latency from
+// one row's multiplier to the next, so each row forms its first two limbs with plain add/adc
+// and takes the next row's multiplier from the second limb still in a register (no round trip
+// through memory), then runs the remaining limbs on the two flag chains, four per block.
+// Returns the carry above limb 2n - 1 (0 or 1).
+inline std::uint64_t reduceRowsAdx(std::uint64_t* t, const std::uint64_t* mod, std::uint64_t n0,
+                                   int n) noexcept {
+  std::uint64_t top = 0;
+  const std::uint64_t blocks = static_cast<std::uint64_t>((n - 4) / 4);
+  long rows = n;
+  std::uint64_t* rt;
+  const std::uint64_t* ra;
+  std::uint64_t next, hi;
+  __asm__ volatile(
+      "mov (%[t]), %%rdx\n\t"
+      "imul %[n0], %%rdx\n"
+      "1:\n\t"
+      // limbs 0 and 1: t[0] + lo(m * mod[0]) is zero by the choice of m; its carry is t[0] != 0
+      "mulx 0(%[mod]), %%r10, %%r11\n\t"
+      "add 0(%[t]), %%r10\n\t"
+      "adc $0, %%r11\n\t"
+      "mulx 8(%[mod]), %%r10, %[hi]\n\t"
+      "add 8(%[t]), %%r10\n\t"
+      "adc $0, %[hi]\n\t"
+      "add %%r11, %%r10\n\t"
+      "adc $0, %[hi]\n\t"  // cannot overflow: t[0..1] + m * mod[0..1] < 2^192
+      "mov %%r10, 8(%[t])\n\t"
+      "mov %%r10, %[next]\n\t"
+      "imul %[n0], %[next]\n\t"
+      // limbs 2 and 3, then blocks of four; only lea, mov, jmp and jrcxz between the chains
+      "lea 16(%[t]), %[rt]\n\t"
+      "lea 16(%[mod]), %[ra]\n\t"
+      "xor %%r10d, %%r10d\n\t"
+      "mulx 0(%[ra]), %%r10, %%r11\n\t"
+      "adcx 0(%[rt]), %%r10\n\t"
+      "adox %[hi], %%r10\n\t"
+      "mov %%r10, 0(%[rt])\n\t"
+      "mulx 8(%[ra]), %%r10, %[hi]\n\t"
+      "adcx 8(%[rt]), %%r10\n\t"
+      "adox %%r11, %%r10\n\t"
+      "mov %%r10, 8(%[rt])\n\t"
+      "mov %[blocks], %%rcx\n"
+      "2:\n\t"
+      "mulx 16(%[ra]), %%r10, %%r11\n\t"
+      "adcx 16(%[rt]), %%r10\n\t"
+      "adox %[hi], %%r10\n\t"
+      "mov %%r10, 16(%[rt])\n\t"
+      "mulx 24(%[ra]), %%r10, %[hi]\n\t"
+      "adcx 24(%[rt]), %%r10\n\t"
+      "adox %%r11, %%r10\n\t"
+      "mov %%r10, 24(%[rt])\n\t"
+      "mulx 32(%[ra]), %%r10, %%r11\n\t"
+      "adcx 32(%[rt]), %%r10\n\t"
+      "adox %[hi], %%r10\n\t"
+      "mov %%r10, 32(%[rt])\n\t"
+      "mulx 40(%[ra]), %%r10, %[hi]\n\t"
+      "adcx 40(%[rt]), %%r10\n\t"
+      "adox %%r11, %%r10\n\t"
+      "mov %%r10, 40(%[rt])\n\t"
+      "lea 32(%[ra]), %[ra]\n\t"
+      "lea 32(%[rt]), %[rt]\n\t"
+      "lea -1(%%rcx), %%rcx\n\t"
+      "jrcxz 3f\n\t"
+      "jmp 2b\n"
+      "3:\n\t"
+      // fold both chains into the row's carry word, then add it and the running top bit to
+      // the limb above the row (rt + 16 now points at it)
+      "mov $0, %%r10d\n\t"
+      "adcx %%r10, %[hi]\n\t"
+      "adox %%r10, %[hi]\n\t"
+      "xor %%r10d, %%r10d\n\t"
+      "add %[top], %[hi]\n\t"
+      "adc $0, %%r10\n\t"
+      "add %[hi], 16(%[rt])\n\t"
+      "adc $0, %%r10\n\t"
+      "mov %%r10, %[top]\n\t"
+      "mov %[next], %%rdx\n\t"
+      "lea 8(%[t]), %[t]\n\t"
+      "dec %[rows]\n\t"
+      "jnz 1b\n\t"
+      : [t] "+r"(t), [top] "+r"(top), [rows] "+r"(rows), [rt] "=&r"(rt), [ra] "=&r"(ra),
+        [next] "=&r"(next), [hi] "=&r"(hi)
+      : [mod] "r"(mod), [n0] "m"(n0), [blocks] "m"(blocks)
+      : "rcx", "rdx", "r10", "r11", "cc", "memory");
+  return top;
+}
+
+// The last step of a squaring on BMI2/ADX: t[0..2n) = 2 * t + the squares a[i]^2 at limbs 2i,
+// 2i + 1. CF carries the doubling (adcx x, x shifts one bit across the limbs), OF the squares.
+// Both chains end at zero, as the sum is a^2 < 2^(128n).
+inline void addSquaresAdx(std::uint64_t* t, const std::uint64_t* a, long n) noexcept {
+  __asm__ volatile(
+      "xor %%eax, %%eax\n"
+      "1:\n\t"
+      "mov (%[a]), %%rdx\n\t"
+      "mulx %%rdx, %%r10, %%r11\n\t"
+      "mov (%[t]), %%rax\n\t"
+      "adcx %%rax, %%rax\n\t"
+      "adox %%r10, %%rax\n\t"
+      "mov %%rax, (%[t])\n\t"
+      "mov 8(%[t]), %%rax\n\t"
+      "adcx %%rax, %%rax\n\t"
+      "adox %%r11, %%rax\n\t"
+      "mov %%rax, 8(%[t])\n\t"
+      "lea 8(%[a]), %[a]\n\t"
+      "lea 16(%[t]), %[t]\n\t"
+      "lea -1(%[n]), %[n]\n\t"
+      "jrcxz 2f\n\t"
+      "jmp 1b\n"
+      "2:\n\t"
+      : [t] "+r"(t), [a] "+r"(a), [n] "+c"(n)
+      :
+      : "rax", "rdx", "r10", "r11", "cc", "memory");
+}
+
 bool cpuHasAdx() noexcept {
   unsigned eax = 0, ebx = 0, ecx = 0, edx = 0;
   __asm__("cpuid" : "=a"(eax), "=b"(ebx), "=c"(ecx), "=d"(edx) : "a"(0), "c"(0));
@@ -309,6 +425,9 @@ template <typename L, typename W>
 struct RowKernel {
   static bool accelerated() noexcept { return false; }
   static L run(bool, L* t, const L* a, int n, L b) noexcept { return mulAddRow<L, W>(t, a, n, b); }
+  // The whole reduction in one kernel where there is one; false to use the rows.
+  static bool reduceAll(bool, L*, const L*, L, int, L&) noexcept { return false; }
+  static bool addSquares(bool, L*, const L*, int) noexcept { return false; }
 };
 
 #if defined(TESSEL_HAVE_ADX_KERNEL) && defined(__SIZEOF_INT128__)
@@ -318,6 +437,17 @@ struct RowKernel<std::uint64_t, unsigned __int128> {
   static std::uint64_t run(bool fast, std::uint64_t* t, const std::uint64_t* a, int n,
                            std::uint64_t b) noexcept {
     return fast ? mulAddRowAdx(t, a, n, b) : mulAddRow<std::uint64_t, unsigned __int128>(t, a, n, b);
+  }
+  static bool reduceAll(bool fast, std::uint64_t* t, const std::uint64_t* mod, std::uint64_t n0, int n,
+                        std::uint64_t& top) noexcept {
+    if (!fast || n < 8 || n % 4 != 0) return false;
+    top = reduceRowsAdx(t, mod, n0, n);
+    return true;
+  }
+  static bool addSquares(bool fast, std::uint64_t* t, const std::uint64_t* a, int n) noexcept {
+    if (!fast || n < 1) return false;
+    addSquaresAdx(t, a, n);
+    return true;
   }
 };
 #endif
@@ -385,9 +515,16 @@ struct Montgomery {
   // which saves nearly half of the multiplications of a general product.
   void square(const L* a, L* out) const noexcept {
     constexpr int bits = limbBits<L>();
-    for (int i = 0; i < 2 * n; ++i) t[i] = 0;
+    // Row 0 adds into t[1..n) and sets t[n]; each later row adds only into limbs the row before
+    // it wrote, and sets the limb above. Only t[2n - 1] is left to clear.
+    for (int i = 0; i < n; ++i) t[i] = 0;
+    t[2 * n - 1] = 0;
     for (int i = 0; i + 1 < n; ++i) t[i + n] = row(t + 2 * i + 1, a + i + 1, n - i - 1, a[i]);
     // Double the cross products and add the squares a[i]^2 in one pass over t.
+    if (RowKernel<L, W>::addSquares(fast, t, a, n)) {
+      reduce(out);
+      return;
+    }
     L shifted = 0, carry = 0;
     for (int i = 0; i < n; ++i) {
       const L lo = t[2 * i], hi = t[2 * i + 1];
@@ -421,13 +558,14 @@ struct Montgomery {
   void reduce(L* out) const noexcept {
     constexpr int bits = limbBits<L>();
     L top = 0;  // the carry above limb 2n - 1 (0 or 1)
-    for (int i = 0; i < n; ++i) {
-      const L m = static_cast<L>(t[i] * n0);
-      const L c = row(t + i, mod, n, m);
-      const W s = static_cast<W>(t[i + n]) + c + top;
-      t[i + n] = static_cast<L>(s);
-      top = static_cast<L>(s >> bits);
-    }
+    if (!RowKernel<L, W>::reduceAll(fast, t, mod, n0, n, top))
+      for (int i = 0; i < n; ++i) {
+        const L m = static_cast<L>(t[i] * n0);
+        const L c = row(t + i, mod, n, m);
+        const W s = static_cast<W>(t[i + n]) + c + top;
+        t[i + n] = static_cast<L>(s);
+        top = static_cast<L>(s >> bits);
+      }
     // The result (top, t[n..2n)) is below 2n: subtract n once unless that borrows, chosen by
     // mask rather than by branch.
     const L* r = t + n;
@@ -453,17 +591,25 @@ void modExpMontgomery(const BigNumber& x, const BigNumber& e, const BigNumber& m
   } else {
     ctx.setUp(modulus);
   }
+  L x0[maxLimbs<L>()] = {};
   L xm[maxLimbs<L>()] = {};
   L acc[maxLimbs<L>()] = {};
-  Montgomery<L, W>::load(x, acc, ctx.n);
-  ctx.multiply(acc, ctx.r2, xm);  // x * R mod n
+  Montgomery<L, W>::load(x, x0, ctx.n);
+  ctx.multiply(x0, ctx.r2, xm);  // x * R mod n
   std::memcpy(acc, xm, sizeof(L) * static_cast<std::size_t>(ctx.n));
+  // An odd exponent (65537) ends with a product by x itself rather than by x * R: that product
+  // also leaves the Montgomery domain, which saves the separate reduction.
+  bool inDomain = true;
   for (int bit = static_cast<int>(bnBitLength(e)) - 2; bit >= 0; --bit) {
     ctx.square(acc, acc);
-    if ((e.limbs[bit / 32] >> (bit % 32)) & 1u) ctx.multiply(acc, xm, acc);
+    if ((e.limbs[bit / 32] >> (bit % 32)) & 1u) {
+      inDomain = bit != 0;
+      ctx.multiply(acc, inDomain ? xm : x0, acc);
+    }
   }
-  ctx.leaveDomain(acc, acc);
+  if (inDomain) ctx.leaveDomain(acc, acc);
   Montgomery<L, W>::store(acc, ctx.n, result);
+  wipeObject(x0);
   wipeObject(xm);
   wipeObject(acc);
   wipeObject(ctx);
