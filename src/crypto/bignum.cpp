@@ -191,99 +191,74 @@ inline L mulAddRow(L* t, const L* a, int n, L b) noexcept {
 
 // The same row on x86-64 with BMI2/ADX: mulx leaves the flags alone, and adcx/adox run two
 // independent carry chains (CF adds t[j], OF adds the previous high word), so the additions of
-// neighbouring limbs overlap. Eight limbs per block, then one block of four if left, then
-// single limbs; loop control uses only lea, mov, jmp and jrcxz, which keep both flags intact.
-// Chosen at run time from CPUID.
+// neighbouring limbs overlap. The n mod 4 single limbs first (written out, one variant per
+// count, so short rows such as a squaring's last ones pay no loop), then one block of four if
+// left, then blocks of eight; loop control uses only lea, mov, jmp and jrcxz, which keep both
+// flags intact. Chosen at run time from CPUID.
+#define TESSEL_LIMB_LO(off)                  \
+  "mulx " #off "(%[a]), %%r10, %%r11\n\t"    \
+  "adcx " #off "(%[t]), %%r10\n\t"           \
+  "adox %[hi], %%r10\n\t"                    \
+  "mov %%r10, " #off "(%[t])\n\t"
+#define TESSEL_LIMB_HI(off)                  \
+  "mulx " #off "(%[a]), %%r10, %[hi]\n\t"    \
+  "adcx " #off "(%[t]), %%r10\n\t"           \
+  "adox %%r11, %%r10\n\t"                    \
+  "mov %%r10, " #off "(%[t])\n\t"
+#define TESSEL_ROW_TAIL                                                              \
+  "mov %[four], %%rcx\n\t"                                                           \
+  "jrcxz 3f\n\t"                                                                     \
+  TESSEL_LIMB_LO(0) TESSEL_LIMB_HI(8) TESSEL_LIMB_LO(16) TESSEL_LIMB_HI(24)          \
+  "lea 32(%[a]), %[a]\n\t"                                                           \
+  "lea 32(%[t]), %[t]\n"                                                             \
+  "3:\n\t"                                                                           \
+  "mov %[blocks], %%rcx\n\t"                                                         \
+  "jrcxz 6f\n\t" /* jrcxz reaches only 127 bytes: hop over a long jump out */        \
+  "jmp 1f\n"                                                                         \
+  "6:\n\t"                                                                           \
+  "jmp 2f\n"                                                                         \
+  "1:\n\t"                                                                           \
+  TESSEL_LIMB_LO(0) TESSEL_LIMB_HI(8) TESSEL_LIMB_LO(16) TESSEL_LIMB_HI(24)          \
+  TESSEL_LIMB_LO(32) TESSEL_LIMB_HI(40) TESSEL_LIMB_LO(48) TESSEL_LIMB_HI(56)        \
+  "lea 64(%[a]), %[a]\n\t"                                                           \
+  "lea 64(%[t]), %[t]\n\t"                                                           \
+  "lea -1(%%rcx), %%rcx\n\t"                                                         \
+  "jrcxz 2f\n\t"                                                                     \
+  "jmp 1b\n"                                                                         \
+  "2:\n\t"                                                                           \
+  "mov $0, %%r10d\n\t" /* mov keeps the flags: fold both pending carries into hi */  \
+  "adcx %%r10, %[hi]\n\t"                                                            \
+  "adox %%r10, %[hi]\n\t"
+#define TESSEL_ROW_OPERANDS                                 \
+  : [t] "+r"(t), [a] "+r"(a), [hi] "+r"(hi)                 \
+  : "d"(b), [blocks] "r"(blocks), [four] "r"(four)          \
+  : "rcx", "r10", "r11", "cc", "memory"
+
 inline std::uint64_t mulAddRowAdx(std::uint64_t* t, const std::uint64_t* a, int n,
                                   std::uint64_t b) noexcept {
   std::uint64_t hi = 0;
-  const long blocks = n >> 3, four = (n >> 2) & 1, rest = n & 3;
-  __asm__ volatile(
-      "xor %%r10d, %%r10d\n\t"  // CF = OF = 0
-      "mov %[blocks], %%rcx\n"
-      "1:\n\t"
-      "jrcxz 6f\n\t"  // jrcxz reaches only 127 bytes: hop over a long jump out
-      "jmp 7f\n"
-      "6:\n\t"
-      "jmp 2f\n"
-      "7:\n\t"
-      "mulx 0(%[a]), %%r10, %%r11\n\t"
-      "adcx 0(%[t]), %%r10\n\t"
-      "adox %[hi], %%r10\n\t"
-      "mov %%r10, 0(%[t])\n\t"
-      "mulx 8(%[a]), %%r10, %[hi]\n\t"
-      "adcx 8(%[t]), %%r10\n\t"
-      "adox %%r11, %%r10\n\t"
-      "mov %%r10, 8(%[t])\n\t"
-      "mulx 16(%[a]), %%r10, %%r11\n\t"
-      "adcx 16(%[t]), %%r10\n\t"
-      "adox %[hi], %%r10\n\t"
-      "mov %%r10, 16(%[t])\n\t"
-      "mulx 24(%[a]), %%r10, %[hi]\n\t"
-      "adcx 24(%[t]), %%r10\n\t"
-      "adox %%r11, %%r10\n\t"
-      "mov %%r10, 24(%[t])\n\t"
-      "mulx 32(%[a]), %%r10, %%r11\n\t"
-      "adcx 32(%[t]), %%r10\n\t"
-      "adox %[hi], %%r10\n\t"
-      "mov %%r10, 32(%[t])\n\t"
-      "mulx 40(%[a]), %%r10, %[hi]\n\t"
-      "adcx 40(%[t]), %%r10\n\t"
-      "adox %%r11, %%r10\n\t"
-      "mov %%r10, 40(%[t])\n\t"
-      "mulx 48(%[a]), %%r10, %%r11\n\t"
-      "adcx 48(%[t]), %%r10\n\t"
-      "adox %[hi], %%r10\n\t"
-      "mov %%r10, 48(%[t])\n\t"
-      "mulx 56(%[a]), %%r10, %[hi]\n\t"
-      "adcx 56(%[t]), %%r10\n\t"
-      "adox %%r11, %%r10\n\t"
-      "mov %%r10, 56(%[t])\n\t"
-      "lea 64(%[a]), %[a]\n\t"
-      "lea 64(%[t]), %[t]\n\t"
-      "lea -1(%%rcx), %%rcx\n\t"
-      "jmp 1b\n"
-      "2:\n\t"
-      "mov %[four], %%rcx\n\t"
-      "jrcxz 3f\n\t"
-      "mulx 0(%[a]), %%r10, %%r11\n\t"
-      "adcx 0(%[t]), %%r10\n\t"
-      "adox %[hi], %%r10\n\t"
-      "mov %%r10, 0(%[t])\n\t"
-      "mulx 8(%[a]), %%r10, %[hi]\n\t"
-      "adcx 8(%[t]), %%r10\n\t"
-      "adox %%r11, %%r10\n\t"
-      "mov %%r10, 8(%[t])\n\t"
-      "mulx 16(%[a]), %%r10, %%r11\n\t"
-      "adcx 16(%[t]), %%r10\n\t"
-      "adox %[hi], %%r10\n\t"
-      "mov %%r10, 16(%[t])\n\t"
-      "mulx 24(%[a]), %%r10, %[hi]\n\t"
-      "adcx 24(%[t]), %%r10\n\t"
-      "adox %%r11, %%r10\n\t"
-      "mov %%r10, 24(%[t])\n\t"
-      "lea 32(%[a]), %[a]\n\t"
-      "lea 32(%[t]), %[t]\n"
-      "3:\n\t"
-      "mov %[rest], %%rcx\n"
-      "4:\n\t"
-      "jrcxz 5f\n\t"
-      "mulx (%[a]), %%r10, %%r11\n\t"
-      "adcx (%[t]), %%r10\n\t"
-      "adox %[hi], %%r10\n\t"
-      "mov %%r10, (%[t])\n\t"
-      "mov %%r11, %[hi]\n\t"
-      "lea 8(%[a]), %[a]\n\t"
-      "lea 8(%[t]), %[t]\n\t"
-      "lea -1(%%rcx), %%rcx\n\t"
-      "jmp 4b\n"
-      "5:\n\t"
-      "mov $0, %%r10d\n\t"  // mov keeps the flags: fold both pending carries into hi
-      "adcx %%r10, %[hi]\n\t"
-      "adox %%r10, %[hi]\n\t"
-      : [t] "+r"(t), [a] "+r"(a), [hi] "+r"(hi)
-      : "d"(b), [blocks] "r"(blocks), [four] "r"(four), [rest] "r"(rest)
-      : "rcx", "r10", "r11", "cc", "memory");
+  const long blocks = n >> 3, four = (n >> 2) & 1;
+  switch (n & 3) {
+    case 0:
+      __asm__ volatile("xor %%r10d, %%r10d\n\t" TESSEL_ROW_TAIL TESSEL_ROW_OPERANDS);
+      break;
+    case 1:
+      __asm__ volatile("xor %%r10d, %%r10d\n\t" TESSEL_LIMB_LO(0) "mov %%r11, %[hi]\n\t"
+                       "lea 8(%[a]), %[a]\n\t"
+                       "lea 8(%[t]), %[t]\n\t" TESSEL_ROW_TAIL TESSEL_ROW_OPERANDS);
+      break;
+    case 2:
+      __asm__ volatile("xor %%r10d, %%r10d\n\t" TESSEL_LIMB_LO(0) TESSEL_LIMB_HI(8)
+                       "lea 16(%[a]), %[a]\n\t"
+                       "lea 16(%[t]), %[t]\n\t" TESSEL_ROW_TAIL TESSEL_ROW_OPERANDS);
+      break;
+    default:
+      __asm__ volatile("xor %%r10d, %%r10d\n\t" TESSEL_LIMB_LO(0) TESSEL_LIMB_HI(8)
+                       TESSEL_LIMB_LO(16) "mov %%r11, %[hi]\n\t"
+                       "lea 24(%[a]), %[a]\n\t"
+                       "lea 24(%[t]), %[t]\n\t" TESSEL_ROW_TAIL TESSEL_ROW_OPERANDS);
+      break;
+  }
   return hi;
 }
 
@@ -291,8 +266,85 @@ inline std::uint64_t mulAddRowAdx(std::uint64_t* t, const std::uint64_t* a, int 
 // n rows t[i..i+n) += m_i * mod, m_i = t[i] * n0. What bounds short moduli is the latency from
 // one row's multiplier to the next, so each row forms its first two limbs with plain add/adc
 // and takes the next row's multiplier from the second limb still in a register (no round trip
-// through memory), then runs the remaining limbs on the two flag chains, four per block.
+// through memory), then runs the remaining limbs on the two flag chains. Rows of 16 and 32
+// limbs (1024- and 2048-bit moduli) are written out; other sizes loop over blocks of four.
 // Returns the carry above limb 2n - 1 (0 or 1).
+#define TESSEL_RLIMB_LO(off)                 \
+  "mulx " #off "(%[ra]), %%r10, %%r11\n\t"   \
+  "adcx " #off "(%[rt]), %%r10\n\t"          \
+  "adox %[hi], %%r10\n\t"                    \
+  "mov %%r10, " #off "(%[rt])\n\t"
+#define TESSEL_RLIMB_HI(off)                 \
+  "mulx " #off "(%[ra]), %%r10, %[hi]\n\t"   \
+  "adcx " #off "(%[rt]), %%r10\n\t"          \
+  "adox %%r11, %%r10\n\t"                    \
+  "mov %%r10, " #off "(%[rt])\n\t"
+// Limbs 4.. of a row, rt and ra pointing at limb 2; then the offset of limb n from rt.
+#define TESSEL_REDUCE_LOOP                                                           \
+  "mov %[blocks], %%rcx\n"                                                           \
+  "2:\n\t"                                                                           \
+  TESSEL_RLIMB_LO(16) TESSEL_RLIMB_HI(24) TESSEL_RLIMB_LO(32) TESSEL_RLIMB_HI(40)    \
+  "lea 32(%[ra]), %[ra]\n\t"                                                         \
+  "lea 32(%[rt]), %[rt]\n\t"                                                         \
+  "lea -1(%%rcx), %%rcx\n\t"                                                         \
+  "jrcxz 3f\n\t"                                                                     \
+  "jmp 2b\n"                                                                         \
+  "3:\n\t"
+#define TESSEL_REDUCE_16 \
+  TESSEL_RLIMB_LO(16) TESSEL_RLIMB_HI(24) TESSEL_RLIMB_LO(32) TESSEL_RLIMB_HI(40) \
+  TESSEL_RLIMB_LO(48) TESSEL_RLIMB_HI(56) TESSEL_RLIMB_LO(64) TESSEL_RLIMB_HI(72) \
+  TESSEL_RLIMB_LO(80) TESSEL_RLIMB_HI(88) TESSEL_RLIMB_LO(96) TESSEL_RLIMB_HI(104) \
+  /* */
+#define TESSEL_REDUCE_32 \
+  TESSEL_RLIMB_LO(16) TESSEL_RLIMB_HI(24) TESSEL_RLIMB_LO(32) TESSEL_RLIMB_HI(40) \
+  TESSEL_RLIMB_LO(48) TESSEL_RLIMB_HI(56) TESSEL_RLIMB_LO(64) TESSEL_RLIMB_HI(72) \
+  TESSEL_RLIMB_LO(80) TESSEL_RLIMB_HI(88) TESSEL_RLIMB_LO(96) TESSEL_RLIMB_HI(104) \
+  TESSEL_RLIMB_LO(112) TESSEL_RLIMB_HI(120) TESSEL_RLIMB_LO(128) TESSEL_RLIMB_HI(136) \
+  TESSEL_RLIMB_LO(144) TESSEL_RLIMB_HI(152) TESSEL_RLIMB_LO(160) TESSEL_RLIMB_HI(168) \
+  TESSEL_RLIMB_LO(176) TESSEL_RLIMB_HI(184) TESSEL_RLIMB_LO(192) TESSEL_RLIMB_HI(200) \
+  TESSEL_RLIMB_LO(208) TESSEL_RLIMB_HI(216) TESSEL_RLIMB_LO(224) TESSEL_RLIMB_HI(232) \
+  /* */
+#define TESSEL_REDUCE_ASM(middle, above)                                                     \
+  __asm__ volatile(                                                                          \
+      "mov (%[t]), %%rdx\n\t"                                                                \
+      "imul %[n0], %%rdx\n"                                                                  \
+      "1:\n\t" /* limbs 0 and 1: t[0] + lo(m * mod[0]) is zero by the choice of m */         \
+      "mulx 0(%[mod]), %%r10, %%r11\n\t"                                                     \
+      "add 0(%[t]), %%r10\n\t" /* its carry is t[0] != 0 */                                  \
+      "adc $0, %%r11\n\t"                                                                    \
+      "mulx 8(%[mod]), %%r10, %[hi]\n\t"                                                     \
+      "add 8(%[t]), %%r10\n\t"                                                               \
+      "adc $0, %[hi]\n\t"                                                                    \
+      "add %%r11, %%r10\n\t"                                                                 \
+      "adc $0, %[hi]\n\t" /* cannot overflow: t[0..1] + m * mod[0..1] < 2^192 */             \
+      "mov %%r10, 8(%[t])\n\t"                                                               \
+      "mov %%r10, %[next]\n\t"                                                               \
+      "imul %[n0], %[next]\n\t"                                                              \
+      /* limbs 2 and 3, then the rest; only lea, mov, jmp and jrcxz between the chains */   \
+      "lea 16(%[t]), %[rt]\n\t"                                                              \
+      "lea 16(%[mod]), %[ra]\n\t"                                                            \
+      "xor %%r10d, %%r10d\n\t"                                                               \
+      TESSEL_RLIMB_LO(0) TESSEL_RLIMB_HI(8) middle                                           \
+      /* fold both chains into the row's carry word, then add it and the running top bit */ \
+      /* to the limb above the row */                                                        \
+      "mov $0, %%r10d\n\t"                                                                   \
+      "adcx %%r10, %[hi]\n\t"                                                                \
+      "adox %%r10, %[hi]\n\t"                                                                \
+      "xor %%r10d, %%r10d\n\t"                                                               \
+      "add %[top], %[hi]\n\t"                                                                \
+      "adc $0, %%r10\n\t"                                                                    \
+      "add %[hi], " above "(%[rt])\n\t"                                                      \
+      "adc $0, %%r10\n\t"                                                                    \
+      "mov %%r10, %[top]\n\t"                                                                \
+      "mov %[next], %%rdx\n\t"                                                               \
+      "lea 8(%[t]), %[t]\n\t"                                                                \
+      "dec %[rows]\n\t"                                                                      \
+      "jnz 1b\n\t"                                                                           \
+      : [t] "+r"(t), [top] "+r"(top), [rows] "+r"(rows), [rt] "=&r"(rt), [ra] "=&r"(ra),     \
+        [next] "=&r"(next), [hi] "=&r"(hi)                                                   \
+      : [mod] "r"(mod), [n0] "m"(n0), [blocks] "m"(blocks)                                   \
+      : "rcx", "rdx", "r10", "r11", "cc", "memory")
+
 inline std::uint64_t reduceRowsAdx(std::uint64_t* t, const std::uint64_t* mod, std::uint64_t n0,
                                    int n) noexcept {
   std::uint64_t top = 0;
@@ -301,77 +353,12 @@ inline std::uint64_t reduceRowsAdx(std::uint64_t* t, const std::uint64_t* mod, s
   std::uint64_t* rt;
   const std::uint64_t* ra;
   std::uint64_t next, hi;
-  __asm__ volatile(
-      "mov (%[t]), %%rdx\n\t"
-      "imul %[n0], %%rdx\n"
-      "1:\n\t"
-      // limbs 0 and 1: t[0] + lo(m * mod[0]) is zero by the choice of m; its carry is t[0] != 0
-      "mulx 0(%[mod]), %%r10, %%r11\n\t"
-      "add 0(%[t]), %%r10\n\t"
-      "adc $0, %%r11\n\t"
-      "mulx 8(%[mod]), %%r10, %[hi]\n\t"
-      "add 8(%[t]), %%r10\n\t"
-      "adc $0, %[hi]\n\t"
-      "add %%r11, %%r10\n\t"
-      "adc $0, %[hi]\n\t"  // cannot overflow: t[0..1] + m * mod[0..1] < 2^192
-      "mov %%r10, 8(%[t])\n\t"
-      "mov %%r10, %[next]\n\t"
-      "imul %[n0], %[next]\n\t"
-      // limbs 2 and 3, then blocks of four; only lea, mov, jmp and jrcxz between the chains
-      "lea 16(%[t]), %[rt]\n\t"
-      "lea 16(%[mod]), %[ra]\n\t"
-      "xor %%r10d, %%r10d\n\t"
-      "mulx 0(%[ra]), %%r10, %%r11\n\t"
-      "adcx 0(%[rt]), %%r10\n\t"
-      "adox %[hi], %%r10\n\t"
-      "mov %%r10, 0(%[rt])\n\t"
-      "mulx 8(%[ra]), %%r10, %[hi]\n\t"
-      "adcx 8(%[rt]), %%r10\n\t"
-      "adox %%r11, %%r10\n\t"
-      "mov %%r10, 8(%[rt])\n\t"
-      "mov %[blocks], %%rcx\n"
-      "2:\n\t"
-      "mulx 16(%[ra]), %%r10, %%r11\n\t"
-      "adcx 16(%[rt]), %%r10\n\t"
-      "adox %[hi], %%r10\n\t"
-      "mov %%r10, 16(%[rt])\n\t"
-      "mulx 24(%[ra]), %%r10, %[hi]\n\t"
-      "adcx 24(%[rt]), %%r10\n\t"
-      "adox %%r11, %%r10\n\t"
-      "mov %%r10, 24(%[rt])\n\t"
-      "mulx 32(%[ra]), %%r10, %%r11\n\t"
-      "adcx 32(%[rt]), %%r10\n\t"
-      "adox %[hi], %%r10\n\t"
-      "mov %%r10, 32(%[rt])\n\t"
-      "mulx 40(%[ra]), %%r10, %[hi]\n\t"
-      "adcx 40(%[rt]), %%r10\n\t"
-      "adox %%r11, %%r10\n\t"
-      "mov %%r10, 40(%[rt])\n\t"
-      "lea 32(%[ra]), %[ra]\n\t"
-      "lea 32(%[rt]), %[rt]\n\t"
-      "lea -1(%%rcx), %%rcx\n\t"
-      "jrcxz 3f\n\t"
-      "jmp 2b\n"
-      "3:\n\t"
-      // fold both chains into the row's carry word, then add it and the running top bit to
-      // the limb above the row (rt + 16 now points at it)
-      "mov $0, %%r10d\n\t"
-      "adcx %%r10, %[hi]\n\t"
-      "adox %%r10, %[hi]\n\t"
-      "xor %%r10d, %%r10d\n\t"
-      "add %[top], %[hi]\n\t"
-      "adc $0, %%r10\n\t"
-      "add %[hi], 16(%[rt])\n\t"
-      "adc $0, %%r10\n\t"
-      "mov %%r10, %[top]\n\t"
-      "mov %[next], %%rdx\n\t"
-      "lea 8(%[t]), %[t]\n\t"
-      "dec %[rows]\n\t"
-      "jnz 1b\n\t"
-      : [t] "+r"(t), [top] "+r"(top), [rows] "+r"(rows), [rt] "=&r"(rt), [ra] "=&r"(ra),
-        [next] "=&r"(next), [hi] "=&r"(hi)
-      : [mod] "r"(mod), [n0] "m"(n0), [blocks] "m"(blocks)
-      : "rcx", "rdx", "r10", "r11", "cc", "memory");
+  if (n == 16)
+    TESSEL_REDUCE_ASM(TESSEL_REDUCE_16, "112");
+  else if (n == 32)
+    TESSEL_REDUCE_ASM(TESSEL_REDUCE_32, "240");
+  else
+    TESSEL_REDUCE_ASM(TESSEL_REDUCE_LOOP, "16");
   return top;
 }
 
