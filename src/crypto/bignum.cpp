@@ -390,6 +390,43 @@ inline void addSquaresAdx(std::uint64_t* t, const std::uint64_t* a, long n) noex
       : "rax", "rdx", "r10", "r11", "cc", "memory");
 }
 
+// out = r - mod over n limbs (n a multiple of four) on one sbb chain; returns the mask that
+// keeps r instead: all ones when r (with the carry bit top above it) is below mod.
+inline std::uint64_t subtractAdx(const std::uint64_t* r, const std::uint64_t* mod, std::uint64_t* out,
+                                 std::uint64_t top, long n) noexcept {
+  long blocks = n / 4;
+  std::uint64_t keep;
+  __asm__ volatile(
+      "xor %%eax, %%eax\n"
+      "1:\n\t"
+      "mov 0(%[r]), %%rax\n\t"
+      "sbb 0(%[m]), %%rax\n\t"
+      "mov %%rax, 0(%[o])\n\t"
+      "mov 8(%[r]), %%rax\n\t"
+      "sbb 8(%[m]), %%rax\n\t"
+      "mov %%rax, 8(%[o])\n\t"
+      "mov 16(%[r]), %%rax\n\t"
+      "sbb 16(%[m]), %%rax\n\t"
+      "mov %%rax, 16(%[o])\n\t"
+      "mov 24(%[r]), %%rax\n\t"
+      "sbb 24(%[m]), %%rax\n\t"
+      "mov %%rax, 24(%[o])\n\t"
+      "lea 32(%[r]), %[r]\n\t"
+      "lea 32(%[m]), %[m]\n\t"
+      "lea 32(%[o]), %[o]\n\t"
+      "lea -1(%[c]), %[c]\n\t"
+      "jrcxz 2f\n\t"
+      "jmp 1b\n"
+      "2:\n\t"
+      "sbb $0, %[top]\n\t"  // borrows only when top is 0 and the limbs borrowed: r < mod
+      "sbb %[keep], %[keep]\n\t"
+      : [r] "+r"(r), [m] "+r"(mod), [o] "+r"(out), [c] "+c"(blocks), [top] "+r"(top),
+        [keep] "=r"(keep)
+      :
+      : "rax", "cc", "memory");
+  return keep;
+}
+
 bool cpuHasAdx() noexcept {
   unsigned eax = 0, ebx = 0, ecx = 0, edx = 0;
   __asm__("cpuid" : "=a"(eax), "=b"(ebx), "=c"(ecx), "=d"(edx) : "a"(0), "c"(0));
@@ -415,6 +452,7 @@ struct RowKernel {
   // The whole reduction in one kernel where there is one; false to use the rows.
   static bool reduceAll(bool, L*, const L*, L, int, L&) noexcept { return false; }
   static bool addSquares(bool, L*, const L*, int) noexcept { return false; }
+  static bool subtract(bool, const L*, const L*, L*, L, int, L&) noexcept { return false; }
 };
 
 #if defined(TESSEL_HAVE_ADX_KERNEL) && defined(__SIZEOF_INT128__)
@@ -434,6 +472,12 @@ struct RowKernel<std::uint64_t, unsigned __int128> {
   static bool addSquares(bool fast, std::uint64_t* t, const std::uint64_t* a, int n) noexcept {
     if (!fast || n < 1) return false;
     addSquaresAdx(t, a, n);
+    return true;
+  }
+  static bool subtract(bool fast, const std::uint64_t* r, const std::uint64_t* mod, std::uint64_t* out,
+                       std::uint64_t top, int n, std::uint64_t& keep) noexcept {
+    if (!fast || n < 4 || n % 4 != 0) return false;
+    keep = subtractAdx(r, mod, out, top, n);
     return true;
   }
 };
@@ -556,6 +600,11 @@ struct Montgomery {
     // The result (top, t[n..2n)) is below 2n: subtract n once unless that borrows, chosen by
     // mask rather than by branch.
     const L* r = t + n;
+    L keepR = 0;
+    if (RowKernel<L, W>::subtract(fast, r, mod, out, top, n, keepR)) {  // out never overlaps t
+      for (int j = 0; j < n; ++j) out[j] = static_cast<L>((r[j] & keepR) | (out[j] & ~keepR));
+      return;
+    }
     L borrow = 0;
     for (int j = 0; j < n; ++j) {  // double-width difference: compilers emit a sub/sbb chain
       const W d = static_cast<W>(static_cast<W>(r[j]) - mod[j] - borrow);
