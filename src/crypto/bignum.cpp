@@ -234,7 +234,7 @@ inline L mulAddRow(L* t, const L* a, int n, L b) noexcept {
   : "d"(b), [blocks] "r"(blocks), [four] "r"(four)          \
   : "rcx", "r10", "r11", "cc", "memory"
 
-inline std::uint64_t mulAddRowAdx(std::uint64_t* t, const std::uint64_t* a, int n,
+__attribute__((always_inline)) inline std::uint64_t mulAddRowAdx(std::uint64_t* t, const std::uint64_t* a, int n,
                                   std::uint64_t b) noexcept {
   std::uint64_t hi = 0;
   const long blocks = n >> 3, four = (n >> 2) & 1;
@@ -620,13 +620,13 @@ struct Montgomery {
 template <typename L, typename W>
 void modExpMontgomery(const BigNumber& x, const BigNumber& e, const BigNumber& modulus,
                       const Montgomery<L, W>* prepared, BigNumber& result) noexcept {
-  Montgomery<L, W> ctx;
-  if (prepared != nullptr) {
-    ctx = *prepared;  // a private copy: the scratch is per call, the prepared one is shared
+  // A private copy of a prepared context (made directly, not over a zeroed one): the scratch is
+  // per call, the prepared one is shared.
+  Montgomery<L, W> ctx = prepared != nullptr ? *prepared : Montgomery<L, W>();
+  if (prepared != nullptr)
     ctx.fast = RowKernel<L, W>::accelerated();
-  } else {
+  else
     ctx.setUp(modulus);
-  }
   L x0[maxLimbs<L>()] = {};
   L xm[maxLimbs<L>()] = {};
   L acc[maxLimbs<L>()] = {};
@@ -770,6 +770,24 @@ bool bnRead(const char* text, unsigned radix, BigNumber& out) noexcept {
     for (int limb = 0; left > 0; ++limb) {
       const std::size_t take = left < 8 ? left : 8;
       u32 v = 0;
+      if (take == 8) {
+        // A whole limb: eight independent look-ups, one check of their sign bits, and the
+        // nibbles combined as a tree rather than through one serial shift chain.
+        const unsigned char* q = reinterpret_cast<const unsigned char*>(text + left - 8);
+        const int d0 = kDigitValue[q[0]], d1 = kDigitValue[q[1]], d2 = kDigitValue[q[2]],
+                  d3 = kDigitValue[q[3]], d4 = kDigitValue[q[4]], d5 = kDigitValue[q[5]],
+                  d6 = kDigitValue[q[6]], d7 = kDigitValue[q[7]];
+        if (((d0 | d1) | (d2 | d3) | ((d4 | d5) | (d6 | d7))) < 0) {
+          wipeObject(out);
+          return false;
+        }
+        out.limbs[limb] = ((static_cast<u32>(d0) << 28 | static_cast<u32>(d1) << 24) |
+                           (static_cast<u32>(d2) << 20 | static_cast<u32>(d3) << 16)) |
+                          ((static_cast<u32>(d4) << 12 | static_cast<u32>(d5) << 8) |
+                           (static_cast<u32>(d6) << 4 | static_cast<u32>(d7)));
+        left -= 8;
+        continue;
+      }
       for (const char* p = text + left - take; p < text + left; ++p) {
         const int d = kDigitValue[static_cast<unsigned char>(*p)];
         if (d < 0) {
