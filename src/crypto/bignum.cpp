@@ -9,9 +9,10 @@
 // bnModExpPortable so tests cover it on every host).
 //
 // Where the time goes in an RSA public operation (e = 65537): sixteen squarings and two
-// products, each a set of "rows" t += a * b[i] (mulAddRow, or its BMI2/ADX assembly twin on
-// x86-64), plus one long division for R^2 mod n. Squarings form each cross product once;
-// reductions are separate rows, which keeps one carry chain per loop.
+// products (x * R^2 into the domain, the last one by x out of it), each a set of "rows"
+// t += a * b[i] (mulAddRow, or its BMI2/ADX assembly twin on x86-64) and a reduction of as
+// many rows (one assembly kernel on x86-64); the long division for R^2 mod n is done once per
+// modulus. Squarings form each cross product once.
 #include "crypto/bignum.h"
 
 #include <atomic>
