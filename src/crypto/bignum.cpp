@@ -428,6 +428,76 @@ inline std::uint64_t subtractAdx(const std::uint64_t* r, const std::uint64_t* mo
   return keep;
 }
 
+// The cross products a[i] * a[j], i < j, of a 16-limb squaring (1024-bit moduli) written out
+// row by row: t[i + j] += a[i] * a[j], each row's carry word set at t[i + 16]. The same rows as
+// the looped kernel, without its per-row set-up, which costs as much as the short rows' work.
+// t[0..16) must be zero on entry.
+#define TESSEL_SQ_BEGIN(aoff) \
+  "mov " #aoff "(%[a]), %%rdx\n\t" "xor %%eax, %%eax\n\t"
+#define TESSEL_SQ_LO(aoff, toff)              \
+  "mulx " #aoff "(%[a]), %%r10, %%r11\n\t"    \
+  "adcx " #toff "(%[t]), %%r10\n\t"           \
+  "adox %%rax, %%r10\n\t"                     \
+  "mov %%r10, " #toff "(%[t])\n\t"
+#define TESSEL_SQ_HI(aoff, toff)              \
+  "mulx " #aoff "(%[a]), %%r10, %%rax\n\t"    \
+  "adcx " #toff "(%[t]), %%r10\n\t"           \
+  "adox %%r11, %%r10\n\t"                     \
+  "mov %%r10, " #toff "(%[t])\n\t"
+#define TESSEL_SQ_END(toff) \
+  "mov $0, %%r10d\n\t" "adcx %%r10, %%rax\n\t" "adox %%r10, %%rax\n\t" "mov %%rax, " #toff "(%[t])\n\t"
+#define TESSEL_SQ_END_ODD(toff) "mov %%r11, %%rax\n\t" TESSEL_SQ_END(toff)
+
+inline void crossProducts16Adx(std::uint64_t* t, const std::uint64_t* a) noexcept {
+  __asm__ volatile(
+      TESSEL_SQ_BEGIN(0) TESSEL_SQ_LO(8, 8) TESSEL_SQ_HI(16, 16) TESSEL_SQ_LO(24, 24)
+      TESSEL_SQ_HI(32, 32) TESSEL_SQ_LO(40, 40) TESSEL_SQ_HI(48, 48) TESSEL_SQ_LO(56, 56)
+      TESSEL_SQ_HI(64, 64) TESSEL_SQ_LO(72, 72) TESSEL_SQ_HI(80, 80) TESSEL_SQ_LO(88, 88)
+      TESSEL_SQ_HI(96, 96) TESSEL_SQ_LO(104, 104) TESSEL_SQ_HI(112, 112) TESSEL_SQ_LO(120, 120)
+      TESSEL_SQ_END_ODD(128)
+      TESSEL_SQ_BEGIN(8) TESSEL_SQ_LO(16, 24) TESSEL_SQ_HI(24, 32) TESSEL_SQ_LO(32, 40)
+      TESSEL_SQ_HI(40, 48) TESSEL_SQ_LO(48, 56) TESSEL_SQ_HI(56, 64) TESSEL_SQ_LO(64, 72)
+      TESSEL_SQ_HI(72, 80) TESSEL_SQ_LO(80, 88) TESSEL_SQ_HI(88, 96) TESSEL_SQ_LO(96, 104)
+      TESSEL_SQ_HI(104, 112) TESSEL_SQ_LO(112, 120) TESSEL_SQ_HI(120, 128) TESSEL_SQ_END(136)
+      TESSEL_SQ_BEGIN(16) TESSEL_SQ_LO(24, 40) TESSEL_SQ_HI(32, 48) TESSEL_SQ_LO(40, 56)
+      TESSEL_SQ_HI(48, 64) TESSEL_SQ_LO(56, 72) TESSEL_SQ_HI(64, 80) TESSEL_SQ_LO(72, 88)
+      TESSEL_SQ_HI(80, 96) TESSEL_SQ_LO(88, 104) TESSEL_SQ_HI(96, 112) TESSEL_SQ_LO(104, 120)
+      TESSEL_SQ_HI(112, 128) TESSEL_SQ_LO(120, 136) TESSEL_SQ_END_ODD(144)
+      TESSEL_SQ_BEGIN(24) TESSEL_SQ_LO(32, 56) TESSEL_SQ_HI(40, 64) TESSEL_SQ_LO(48, 72)
+      TESSEL_SQ_HI(56, 80) TESSEL_SQ_LO(64, 88) TESSEL_SQ_HI(72, 96) TESSEL_SQ_LO(80, 104)
+      TESSEL_SQ_HI(88, 112) TESSEL_SQ_LO(96, 120) TESSEL_SQ_HI(104, 128) TESSEL_SQ_LO(112, 136)
+      TESSEL_SQ_HI(120, 144) TESSEL_SQ_END(152)
+      TESSEL_SQ_BEGIN(32) TESSEL_SQ_LO(40, 72) TESSEL_SQ_HI(48, 80) TESSEL_SQ_LO(56, 88)
+      TESSEL_SQ_HI(64, 96) TESSEL_SQ_LO(72, 104) TESSEL_SQ_HI(80, 112) TESSEL_SQ_LO(88, 120)
+      TESSEL_SQ_HI(96, 128) TESSEL_SQ_LO(104, 136) TESSEL_SQ_HI(112, 144) TESSEL_SQ_LO(120, 152)
+      TESSEL_SQ_END_ODD(160)
+      TESSEL_SQ_BEGIN(40) TESSEL_SQ_LO(48, 88) TESSEL_SQ_HI(56, 96) TESSEL_SQ_LO(64, 104)
+      TESSEL_SQ_HI(72, 112) TESSEL_SQ_LO(80, 120) TESSEL_SQ_HI(88, 128) TESSEL_SQ_LO(96, 136)
+      TESSEL_SQ_HI(104, 144) TESSEL_SQ_LO(112, 152) TESSEL_SQ_HI(120, 160) TESSEL_SQ_END(168)
+      TESSEL_SQ_BEGIN(48) TESSEL_SQ_LO(56, 104) TESSEL_SQ_HI(64, 112) TESSEL_SQ_LO(72, 120)
+      TESSEL_SQ_HI(80, 128) TESSEL_SQ_LO(88, 136) TESSEL_SQ_HI(96, 144) TESSEL_SQ_LO(104, 152)
+      TESSEL_SQ_HI(112, 160) TESSEL_SQ_LO(120, 168) TESSEL_SQ_END_ODD(176)
+      TESSEL_SQ_BEGIN(56) TESSEL_SQ_LO(64, 120) TESSEL_SQ_HI(72, 128) TESSEL_SQ_LO(80, 136)
+      TESSEL_SQ_HI(88, 144) TESSEL_SQ_LO(96, 152) TESSEL_SQ_HI(104, 160) TESSEL_SQ_LO(112, 168)
+      TESSEL_SQ_HI(120, 176) TESSEL_SQ_END(184)
+      TESSEL_SQ_BEGIN(64) TESSEL_SQ_LO(72, 136) TESSEL_SQ_HI(80, 144) TESSEL_SQ_LO(88, 152)
+      TESSEL_SQ_HI(96, 160) TESSEL_SQ_LO(104, 168) TESSEL_SQ_HI(112, 176) TESSEL_SQ_LO(120, 184)
+      TESSEL_SQ_END_ODD(192)
+      TESSEL_SQ_BEGIN(72) TESSEL_SQ_LO(80, 152) TESSEL_SQ_HI(88, 160) TESSEL_SQ_LO(96, 168)
+      TESSEL_SQ_HI(104, 176) TESSEL_SQ_LO(112, 184) TESSEL_SQ_HI(120, 192) TESSEL_SQ_END(200)
+      TESSEL_SQ_BEGIN(80) TESSEL_SQ_LO(88, 168) TESSEL_SQ_HI(96, 176) TESSEL_SQ_LO(104, 184)
+      TESSEL_SQ_HI(112, 192) TESSEL_SQ_LO(120, 200) TESSEL_SQ_END_ODD(208)
+      TESSEL_SQ_BEGIN(88) TESSEL_SQ_LO(96, 184) TESSEL_SQ_HI(104, 192) TESSEL_SQ_LO(112, 200)
+      TESSEL_SQ_HI(120, 208) TESSEL_SQ_END(216)
+      TESSEL_SQ_BEGIN(96) TESSEL_SQ_LO(104, 200) TESSEL_SQ_HI(112, 208) TESSEL_SQ_LO(120, 216)
+      TESSEL_SQ_END_ODD(224)
+      TESSEL_SQ_BEGIN(104) TESSEL_SQ_LO(112, 216) TESSEL_SQ_HI(120, 224) TESSEL_SQ_END(232)
+      TESSEL_SQ_BEGIN(112) TESSEL_SQ_LO(120, 232) TESSEL_SQ_END_ODD(240)
+      :
+      : [t] "r"(t), [a] "r"(a)
+      : "rax", "rdx", "r10", "r11", "cc", "memory");
+}
+
 bool cpuHasAdx() noexcept {
   unsigned eax = 0, ebx = 0, ecx = 0, edx = 0;
   __asm__("cpuid" : "=a"(eax), "=b"(ebx), "=c"(ecx), "=d"(edx) : "a"(0), "c"(0));
@@ -454,6 +524,7 @@ struct RowKernel {
   static bool reduceAll(bool, L*, const L*, L, int, L&) noexcept { return false; }
   static bool addSquares(bool, L*, const L*, int) noexcept { return false; }
   static bool subtract(bool, const L*, const L*, L*, L, int, L&) noexcept { return false; }
+  static bool crossProducts(bool, L*, const L*, int) noexcept { return false; }
 };
 
 #if defined(TESSEL_HAVE_ADX_KERNEL) && defined(__SIZEOF_INT128__)
@@ -479,6 +550,11 @@ struct RowKernel<std::uint64_t, unsigned __int128> {
                        std::uint64_t top, int n, std::uint64_t& keep) noexcept {
     if (!fast || n < 4 || n % 4 != 0) return false;
     keep = subtractAdx(r, mod, out, top, n);
+    return true;
+  }
+  static bool crossProducts(bool fast, std::uint64_t* t, const std::uint64_t* a, int n) noexcept {
+    if (!fast || n != 16) return false;
+    crossProducts16Adx(t, a);
     return true;
   }
 };
@@ -551,7 +627,8 @@ struct Montgomery {
     // it wrote, and sets the limb above. Only t[2n - 1] is left to clear.
     for (int i = 0; i < n; ++i) t[i] = 0;
     t[2 * n - 1] = 0;
-    for (int i = 0; i + 1 < n; ++i) t[i + n] = row(t + 2 * i + 1, a + i + 1, n - i - 1, a[i]);
+    if (!RowKernel<L, W>::crossProducts(fast, t, a, n))
+      for (int i = 0; i + 1 < n; ++i) t[i + n] = row(t + 2 * i + 1, a + i + 1, n - i - 1, a[i]);
     // Double the cross products and add the squares a[i]^2 in one pass over t.
     if (RowKernel<L, W>::addSquares(fast, t, a, n)) {
       reduce(out);
