@@ -235,8 +235,9 @@ inline L mulAddRow(L* t, const L* a, int n, L b) noexcept {
   : "d"(b), [blocks] "r"(blocks), [four] "r"(four)          \
   : "rcx", "r10", "r11", "cc", "memory"
 
-__attribute__((always_inline)) inline std::uint64_t mulAddRowAdx(std::uint64_t* t, const std::uint64_t* a, int n,
-                                  std::uint64_t b) noexcept {
+__attribute__((always_inline)) inline std::uint64_t mulAddRowAdx(std::uint64_t* t,
+                                                                  const std::uint64_t* a, int n,
+                                                                  std::uint64_t b) noexcept {
   std::uint64_t hi = 0;
   const long blocks = n >> 3, four = (n >> 2) & 1;
   switch (n & 3) {
@@ -393,8 +394,8 @@ inline void addSquaresAdx(std::uint64_t* t, const std::uint64_t* a, long n) noex
 
 // out = r - mod over n limbs (n a multiple of four) on one sbb chain; returns the mask that
 // keeps r instead: all ones when r (with the carry bit top above it) is below mod.
-inline std::uint64_t subtractAdx(const std::uint64_t* r, const std::uint64_t* mod, std::uint64_t* out,
-                                 std::uint64_t top, long n) noexcept {
+inline std::uint64_t subtractAdx(const std::uint64_t* r, const std::uint64_t* mod,
+                                 std::uint64_t* out, std::uint64_t top, long n) noexcept {
   long blocks = n / 4;
   std::uint64_t keep;
   __asm__ volatile(
@@ -445,7 +446,8 @@ inline std::uint64_t subtractAdx(const std::uint64_t* r, const std::uint64_t* mo
   "adox %%r11, %%r10\n\t"                     \
   "mov %%r10, " #toff "(%[t])\n\t"
 #define TESSEL_SQ_END(toff) \
-  "mov $0, %%r10d\n\t" "adcx %%r10, %%rax\n\t" "adox %%r10, %%rax\n\t" "mov %%rax, " #toff "(%[t])\n\t"
+  "mov $0, %%r10d\n\t" "adcx %%r10, %%rax\n\t" "adox %%r10, %%rax\n\t" \
+  "mov %%rax, " #toff "(%[t])\n\t"
 #define TESSEL_SQ_END_ODD(toff) "mov %%r11, %%rax\n\t" TESSEL_SQ_END(toff)
 
 inline void crossProducts16Adx(std::uint64_t* t, const std::uint64_t* a) noexcept {
@@ -535,8 +537,8 @@ struct RowKernel<std::uint64_t, unsigned __int128> {
                            std::uint64_t b) noexcept {
     return fast ? mulAddRowAdx(t, a, n, b) : mulAddRow<std::uint64_t, unsigned __int128>(t, a, n, b);
   }
-  static bool reduceAll(bool fast, std::uint64_t* t, const std::uint64_t* mod, std::uint64_t n0, int n,
-                        std::uint64_t& top) noexcept {
+  static bool reduceAll(bool fast, std::uint64_t* t, const std::uint64_t* mod, std::uint64_t n0,
+                        int n, std::uint64_t& top) noexcept {
     if (!fast || n < 8 || n % 4 != 0) return false;
     top = reduceRowsAdx(t, mod, n0, n);
     return true;
@@ -546,8 +548,8 @@ struct RowKernel<std::uint64_t, unsigned __int128> {
     addSquaresAdx(t, a, n);
     return true;
   }
-  static bool subtract(bool fast, const std::uint64_t* r, const std::uint64_t* mod, std::uint64_t* out,
-                       std::uint64_t top, int n, std::uint64_t& keep) noexcept {
+  static bool subtract(bool fast, const std::uint64_t* r, const std::uint64_t* mod,
+                       std::uint64_t* out, std::uint64_t top, int n, std::uint64_t& keep) noexcept {
     if (!fast || n < 4 || n % 4 != 0) return false;
     keep = subtractAdx(r, mod, out, top, n);
     return true;
