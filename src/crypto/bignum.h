@@ -79,7 +79,8 @@ void bnReleasePrepared(BnPreparedModulus* prepared) noexcept;
 bool bnModExpPrepared(const BigNumber& base, const BigNumber& exponent, const BnPreparedModulus& prepared,
                       BigNumber& result) noexcept;
 
-// On x86-64 CPUs with BMI2 and ADX the 64-bit Montgomery rows run in a small assembly kernel.
+// On x86-64 CPUs with BMI2 and ADX the 64-bit Montgomery rows, reductions and final
+// subtractions run in small assembly kernels.
 // Tests and benchmarks pass false to force the portable C rows (the default is true), so both
 // are checked on such machines. Affects exponentiations started afterwards.
 void bnAllowAssemblyKernel(bool allowed) noexcept;
