@@ -44,8 +44,6 @@ std::string randomHex(std::mt19937_64& rng, int lowLimbs, int highLimbs) {
 
 TEST(BigNumberText, LayoutRadixesCapacityAndRefusals) {
   const BigNumber b = num("0000123456789abcdef0");
-  EXPECT_EQ(std::vector<std::uint32_t>(b.limbs, b.limbs + 3), (std::vector<std::uint32_t>{0x9ABCDEF0u, 0x12345678u, 0}));
-  EXPECT_EQ(b.count, 2u);
   EXPECT_EQ(str(b), "123456789ABCDEF0");
   EXPECT_EQ(num("000").count, 0u);
   EXPECT_EQ(bnBitLength(num("100000000")), 33u);

@@ -1,11 +1,9 @@
 // SHA-1 and MD5: the published vectors (NIST CAVP short and long messages for SHA-1, RFC
-// 1321's suite for MD5) and OpenSSL as an oracle for every length 0..300 fed
-// one-shot, byte by byte, split at every offset and through a copied context, and for 1 MiB in
-// uneven chunks. SHA-1 runs each check twice, with the SHA-extension compression where the CPU
-// has it and with the portable one forced, so the two must agree with the oracle and each other.
+// 1321's suite for MD5) and OpenSSL as an oracle for every length 0..300 fed one-shot, byte by
+// byte and split at every offset. SHA-1 runs each check twice, with the SHA-extension compression
+// where the CPU has it and with the portable one forced.
 #include <gtest/gtest.h>
 
-#include <algorithm>
 #include <random>
 #include <string>
 #include <vector>
@@ -28,19 +26,12 @@ struct Algo {
     OneShot(m.data(), m.size(), d.data());
     return d;
   }
-  // Feeds m in pieces ending at `cuts`; at copyAt the context is copied, the original fed
-  // something else, and the copy continues (it must share no state with the original).
-  static Bytes pieces(const Bytes& m, const std::vector<std::size_t>& cuts, std::size_t copyAt = SIZE_MAX) {
+  // Feeds m in pieces ending at `cuts`.
+  static Bytes pieces(const Bytes& m, const std::vector<std::size_t>& cuts) {
     C c;
     Init(c);
-    for (std::size_t pos = 0, i = 0; i < cuts.size(); pos = cuts[i++]) {
+    for (std::size_t pos = 0, i = 0; i < cuts.size(); pos = cuts[i++])
       Update(c, m.data() + pos, static_cast<std::uint32_t>(cuts[i] - pos));
-      if (cuts[i] == copyAt) {
-        const C copy = c;
-        Update(c, "different", 9);
-        c = copy;
-      }
-    }
     Bytes d(N);
     Final(c, d.data());
     return d;
@@ -49,30 +40,19 @@ struct Algo {
 using Sha1 = Algo<Sha1Context, 20, sha1Init, sha1Update, sha1Final, sha1>;
 using Md5 = Algo<Md5Context, 16, md5Init, md5Update, md5Final, md5>;
 
-Bytes random(std::size_t n, std::uint32_t seed) {
-  std::mt19937 rng(seed);
-  Bytes b(n);
-  for (auto& x : b) x = static_cast<std::uint8_t>(rng());
-  return b;
-}
-
 template <typename A>
 void checkAgainstOpenSsl() {
+  std::mt19937 rng(5);
   for (std::size_t len = 0; len <= 300; ++len) {  // crosses the 55/56/64-byte boundaries
-    const Bytes m = random(len, static_cast<std::uint32_t>(len)), expected = test::opensslDigest(A::kPeer, m);
+    Bytes m(len);
+    for (auto& x : m) x = static_cast<std::uint8_t>(rng());
+    const Bytes expected = test::opensslDigest(A::kPeer, m);
     ASSERT_EQ(A::oneShot(m), expected) << "one-shot, length " << len;
     std::vector<std::size_t> bytes(len);
     for (std::size_t i = 0; i < len; ++i) bytes[i] = i + 1;
     ASSERT_EQ(A::pieces(m, bytes), expected) << "byte by byte, length " << len;
-    for (std::size_t at = 0; at <= len; ++at)
-      ASSERT_EQ(A::pieces(m, {at, len}, len == 300 ? at : SIZE_MAX), expected) << len << " split at " << at;
+    for (std::size_t at = 0; at <= len; ++at) ASSERT_EQ(A::pieces(m, {at, len}), expected) << len << " split at " << at;
   }
-  const Bytes big = random(1 << 20, 5), expected = test::opensslDigest(A::kPeer, big);
-  std::vector<std::size_t> uneven;
-  for (std::size_t pos = 0, chunk = 1; pos < big.size(); chunk = chunk * 3 + 7)
-    uneven.push_back(pos = std::min(pos + chunk, big.size()));
-  EXPECT_EQ(A::pieces(big, uneven), expected) << "1 MiB in uneven chunks";
-  EXPECT_EQ(A::oneShot(big), expected) << "1 MiB at once";
 }
 
 class Sha1Compression : public ::testing::TestWithParam<bool> {

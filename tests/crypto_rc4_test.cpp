@@ -1,5 +1,5 @@
-// RC4 against RFC 6229's keystreams (seven key lengths, offsets 0..4096: the key schedule and
-// rc4Discard) and OpenSSL for key lengths 1..256 and the envelope's drops, in and out of place.
+// RC4 against RFC 6229's keystreams: seven key lengths, offsets 0..4096 (the key schedule and
+// rc4Discard), every other record out of place.
 #include <gtest/gtest.h>
 
 #include <string>
@@ -29,22 +29,12 @@ TEST(Rc4, Rfc6229Keystreams) {
     const std::string file = std::string("rfc-6229-") + bits + ".txt";
     for (const auto& r : test::readVectorRecords(test::dataPath(file))) {
       const Bytes key = test::fromHex(r.at("KEY")), plain = test::fromHex(r.at("PLAINTEXT"));
-      const Bytes out = rc4(key, std::stoul(r.at("OFFSET")), plain, true);
+      const Bytes out = rc4(key, std::stoul(r.at("OFFSET")), plain, checked % 2 == 0);
       EXPECT_EQ(test::toHex(out), r.at("CIPHERTEXT")) << file << " offset " << r.at("OFFSET");
       ++checked;
     }
   }
   EXPECT_EQ(checked, 7 * 36);  // 18 offsets, 32 bytes each as two 16-byte rows
-}
-
-TEST(Rc4, AgreesWithOpenSslForKeyLengthsAndDrops) {
-  for (std::size_t keyLength : {1u, 5u, 12u, 16u, 20u, 32u, 256u}) {
-    Bytes key(keyLength), data(700);
-    for (std::size_t k = 0; k < keyLength; ++k) key[k] = static_cast<std::uint8_t>(k * 37 + keyLength);
-    for (std::size_t k = 0; k < data.size(); ++k) data[k] = static_cast<std::uint8_t>(k);
-    for (std::size_t drop : {0u, 512u, 625u, 768u})
-      EXPECT_EQ(rc4(key, drop, data, false), test::opensslRc4(key, data, drop)) << keyLength << "/" << drop;
-  }
 }
 
 }  // namespace

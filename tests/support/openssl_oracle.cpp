@@ -13,12 +13,11 @@
 namespace tessel::test {
 namespace {
 void loadProviders() {
-  static const bool loaded = [] {
+  [[maybe_unused]] static const bool loaded = [] {
     OSSL_PROVIDER_load(nullptr, "legacy");
     OSSL_PROVIDER_load(nullptr, "default");
     return true;
   }();
-  (void)loaded;
 }
 
 // Runs a cipher over whole blocks without padding.
@@ -91,13 +90,11 @@ std::string opensslBnMul(const std::string& a, const std::string& b) {
   BN_mul(r.get(), bn(a).get(), bn(b).get(), bnContext().get());
   return hexOf(r);
 }
-
 std::pair<std::string, std::string> opensslBnDiv(const std::string& a, const std::string& b) {
   BnPtr q = bn("0"), r = bn("0");
   BN_div(q.get(), r.get(), bn(a).get(), bn(b).get(), bnContext().get());
   return {hexOf(q), hexOf(r)};
 }
-
 std::string opensslBnModExp(const std::string& base, const std::string& exp, const std::string& mod) {
   BnPtr r = bn("0");
   BN_mod_exp(r.get(), bn(base).get(), bn(exp).get(), bn(mod).get(), bnContext().get());
@@ -105,12 +102,8 @@ std::string opensslBnModExp(const std::string& base, const std::string& exp, con
 }
 
 std::string toHex(const Bytes& bytes) {
-  static const char digits[] = "0123456789abcdef";
   std::string s;
-  for (auto b : bytes) {
-    s += digits[b >> 4];
-    s += digits[b & 15];
-  }
+  for (auto b : bytes) (s += "0123456789abcdef"[b >> 4]) += "0123456789abcdef"[b & 15];
   return s;
 }
 

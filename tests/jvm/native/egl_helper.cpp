@@ -37,11 +37,6 @@ JNIEXPORT jstring JNICALL Java_com_qn_tessel_test_EglContext_nativeLastError(JNI
   return env->NewStringUTF(g_error.c_str());
 }
 
-JNIEXPORT jstring JNICALL Java_com_qn_tessel_test_EglContext_nativeRenderer(JNIEnv* env, jclass) {
-  const GLubyte* renderer = glGetString(GL_RENDERER);
-  return env->NewStringUTF(renderer != nullptr ? reinterpret_cast<const char*>(renderer) : "");
-}
-
 JNIEXPORT jbyteArray JNICALL Java_com_qn_tessel_test_EglContext_nativeReadPixels(JNIEnv* env, jclass, jlong handle) {
   GlesContext* c = fromHandle(handle);
   if (c == nullptr || !c->makeCurrent()) return nullptr;

@@ -31,7 +31,6 @@ final class Bank {
   static String appKeyPem;
   static String encKeyPem;
 
-
   record Result(int exit, Map<String, String> fields, String stderr) {
     String get(String field) {
       return fields.get(field);

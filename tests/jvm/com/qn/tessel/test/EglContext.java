@@ -17,8 +17,6 @@ final class EglContext implements AutoCloseable {
 
   private static native String nativeLastError();
 
-  private static native String nativeRenderer();
-
   private static native byte[] nativeReadPixels(long handle);
 
   private static native void nativeRelease(long handle);
@@ -27,7 +25,6 @@ final class EglContext implements AutoCloseable {
   final int height;
   private final ExecutorService thread;
   private final long handle;
-  final String renderer;
 
   EglContext(int width, int height) throws Exception {
     this.width = width;
@@ -38,13 +35,12 @@ final class EglContext implements AutoCloseable {
       return t;
     });
     final long made = call(() -> nativeCreate(width, height));
-    final String text = call(() -> made == 0 ? nativeLastError() : nativeRenderer());
     if (made == 0) {
+      final String reason = call(EglContext::nativeLastError);
       thread.shutdownNow();
-      throw new IllegalStateException("no offscreen GLES 1.1 context: " + text);
+      throw new IllegalStateException("no offscreen GLES 1.1 context: " + reason);
     }
     this.handle = made;
-    this.renderer = text;
   }
 
   <T> T call(Callable<T> work) throws Exception {

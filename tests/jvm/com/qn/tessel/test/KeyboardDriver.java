@@ -7,15 +7,14 @@ import com.qn.tessel.plugin.QNKbdJniLib;
 /**
  * Types through the keyboard the way a finger does: computes key centres from the surface size
  * the app passed to setNativeSurfaceChanged (10 columns and 4 rows of keys; row 1 shifted right
- * by 0.3 key, row 2 between shift and delete; the number pad as four columns of 2.5 keys) and
- * sends a down and an up at each. It tracks the page and shift state its own taps produce, so
- * it knows the unshuffled layout's keys only: use it with random layout off, or for positions.
+ * by 0.3 key, row 2 between shift and delete) and sends a down and an up at each. It tracks the
+ * page and shift state its own taps produce, so it knows the unshuffled layout's keys only: use
+ * it with random layout off, or for positions.
  */
 final class KeyboardDriver {
   static final String[] LETTERS = {"qwertyuiop", "asdfghjkl", "zxcvbnm"};
   static final String[] SYMBOLS = {"1234567890", "`~!@#$%^&", "*()-_=+"};
   static final String[] SYMBOLS_SHIFTED = {"1234567890", "{}[]\\|:;'", "\",.<>/?"};
-  static final String PAD = "1234567890";
 
   final int handle;
   final double kw;
@@ -88,19 +87,5 @@ final class KeyboardDriver {
 
   void type(String text) {
     for (int k = 0; k < text.length(); ++k) type(text.charAt(k));
-  }
-
-  /** Number pad cell (row, column), columns 2.5 keys wide. */
-  int tapPad(int row, int column) {
-    return tap((column + 0.5) * 2.5 * kw, (row + 0.5) * kh);
-  }
-
-  /** Types digits and '.' on the number pad. */
-  void typePad(String text) {
-    for (char c : text.toCharArray()) {
-      int at = c == '.' ? 10 : PAD.indexOf(c);
-      if (at < 0) throw new IllegalArgumentException("no pad key for " + c);
-      Check.equal(0, at == 10 ? tapPad(3, 1) : tapPad(at / 3, at % 3), "pad '" + c + "'");
-    }
   }
 }
