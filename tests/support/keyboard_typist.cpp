@@ -48,7 +48,9 @@ std::size_t ScopedKeyboard::length() const { return session_->content->length; }
 KeyMap KeyMap::fromSession(const KeyboardSession& s) {
   KeyMap m;
   const auto unmask = [&](const auto& table, std::string& to) {
-    for (std::size_t i = 0; i < to.size(); ++i) to[i] = static_cast<char>(static_cast<std::uint8_t>(table[i] + s.keyMask));
+    for (std::size_t i = 0; i < to.size(); ++i) {
+      to[i] = static_cast<char>(static_cast<std::uint8_t>(table[i] + s.keyMask));
+    }
   };
   unmask(s.letters, m.letters);
   unmask(s.symbolsLower, m.symbolsLower);
@@ -114,8 +116,8 @@ bool Typist::typeOnPad(const std::string& text) {
       ADD_FAILURE() << "no pad key for '" << c << "'";
       return false;
     }
-    const TouchPoint p = c == '.' ? grid_.padCell(3, 1) : grid_.padCell(static_cast<int>(i / 3), static_cast<int>(i % 3));
-    if (!tapExpecting(p, "pad key")) return false;
+    const int cell = c == '.' ? 10 : static_cast<int>(i);  // "." sits at (3, 1)
+    if (!tapExpecting(grid_.padCell(cell / 3, cell % 3), "pad key")) return false;
   }
   return true;
 }

@@ -48,7 +48,9 @@ class KeyGrid {
   KeyGrid(int width, int height) : kw_(width / 10.0), kh_(height / 4.0) {}
   // Character key `position` of full-keyboard row 0, 1 or 2: row 1 starts 0.3 key widths in,
   // row 2's keys follow the 1.5-key-wide shift key.
-  TouchPoint characterKey(int row, int position) const { return at((row == 1 ? 0.3 : row * 0.75) + position + 0.5, row); }
+  TouchPoint characterKey(int row, int position) const {
+    return at((row == 1 ? 0.3 : row * 0.75) + position + 0.5, row);
+  }
   TouchPoint shiftKey() const { return at(0.75, 2); }
   TouchPoint deleteKey() const { return at(9.25, 2); }
   TouchPoint switchKey() const { return at(1.25, 3); }
