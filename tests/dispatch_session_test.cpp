@@ -1,5 +1,5 @@
 // The session's output end to end: text typed by touches, contentOutput under the built-in
-// default modulus, opened with the private half of that key (tests/data/builtin_default_key.pem).
+// default modulus, opened with the private half of that key (crypto_rsa_test checks the pair).
 // The content must rest sealed after every call. (The JVM suite covers the other outputs, the
 // encrypted PIN code and lastError through the native entry points.)
 #include <gtest/gtest.h>
@@ -7,7 +7,6 @@
 #include <string>
 #include <tuple>
 
-#include "crypto/moduli.h"
 #include "server/envelope.h"
 #include "session/output.h"
 #include "session/session.h"
@@ -23,10 +22,6 @@ constexpr int kWidth = 1080, kHeight = 720;
 class SessionOutput : public ::testing::Test {
  protected:
   SessionOutput() : kb_("dispatch-output", kWidth, kHeight) {}
-  void SetUp() override {
-    ASSERT_EQ(std::string(builtinDefaultModulus()), testKey("builtin_default_key.pem").modulusHex())
-        << "tests/data/builtin_default_key.pem is not the built-in default key";
-  }
   // contentOutput, its error code, and the content still sealed afterwards.
   SecureBuffer output(int type, const char* timestamp, int expectedError = 0) {
     const std::string before = kb_.text();

@@ -1,9 +1,8 @@
 // A test-side typist: turns characters into touch coordinates and drives touch() with them.
 //
-// Key centres come from the surface size alone (a 10 x 4 grid, the number pad's four columns
-// of 2.5 key widths), never from the library's dispatch code, so a hit-testing fault shows up
-// as a wrong character. Which key holds which character comes from the standard layout written
-// out here, or from the session's own (possibly shuffled) tables unmasked with its keyMask.
+// Key centres come from the surface size alone, never from the library's dispatch code, so a
+// hit-testing fault shows up as a wrong character; characters come from the standard layout
+// written out here, or from the session's own (possibly shuffled) tables.
 #pragma once
 
 #include <cstdint>
@@ -77,10 +76,9 @@ struct KeyMap {
   static KeyMap fromSession(const KeyboardSession& s);  // the tables with keyMask undone
 };
 
-// Types text through touch(): for each character it presses switch and shift as needed (keeping
-// its own idea of the page and shift state, started from the session's), then the key. Every
-// down must return -1 and every up 0; the first surprise is reported through ADD_FAILURE and
-// typing stops (false).
+// Types text through touch(), pressing switch and shift as needed (tracking page and shift from
+// the session's start state). Every down must give -1 and every up 0; the first surprise is
+// reported through ADD_FAILURE and typing stops (false).
 class Typist {
  public:
   Typist(KeyboardSession& session, const KeyGrid& grid, const KeyMap& map = KeyMap::standard());
