@@ -1,6 +1,7 @@
-// The digital envelope and the RSA helpers byte for byte: with the random source replaced by a
-// known sequence, the device's output must equal the one assembled with OpenSSL alone (raw RSA
-// of the expected padded block, RC4 after the type's drop, the SIMPLEBLOB layout, base64).
+// The digital envelope byte for byte: with the random source replaced by a known sequence, the
+// device's output must equal the one assembled with OpenSSL alone (raw RSA of the expected padded
+// block, RC4 after the type's drop, the SIMPLEBLOB layout, base64). Then the system source with
+// its calls faked. (The RSA helpers alone: crypto_padding_test and crypto_rsa_test.)
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -16,7 +17,7 @@
 namespace tessel::test {
 namespace {
 
-// A full-period byte sequence (x -> 5x + 1 mod 256), so zero bytes do occur in the filler.
+// A full-period byte sequence (x -> 5x + 1 mod 256): a zero byte falls in the filler.
 std::vector<Bytes> gRequests;
 std::uint8_t gNext = 0;
 bool sequenceSource(std::uint8_t* buffer, std::size_t n) {
@@ -34,21 +35,13 @@ class KnownRandom : public ::testing::Test {
   void TearDown() override { setRandomSourceForTesting(nullptr); }
 };
 
-// Filler as the padding routines use it: zero bytes become 0x01. `head` and `tail` go around it.
-Bytes withFiller(Bytes head, const Bytes& filler, const Bytes& tail) {
-  for (std::uint8_t b : filler) head.push_back(b ? b : 1);
-  head.insert(head.end(), tail.begin(), tail.end());
-  return head;
-}
+// The PKCS#1 type 2 block, its filler as the padding routine uses it: zero bytes become 0x01.
 Bytes pkcs1Block(const Bytes& filler, const Bytes& message) {
-  Bytes tail = {0x00};
-  tail.insert(tail.end(), message.begin(), message.end());
-  return withFiller({0x00, 0x02}, filler, tail);
-}
-std::string upperHex(const Bytes& b) {
-  std::string s = toHex(b);
-  for (char& c : s) c = static_cast<char>(std::toupper(static_cast<unsigned char>(c)));
-  return s;
+  Bytes block = {0x00, 0x02};
+  for (std::uint8_t b : filler) block.push_back(b ? b : 1);
+  block.push_back(0x00);
+  block.insert(block.end(), message.begin(), message.end());
+  return block;
 }
 std::string text(const SecureBuffer& b) { return b ? std::string(b.c_str(), b.size()) : std::string("<absent>"); }
 
@@ -79,27 +72,6 @@ TEST_F(KnownRandom, EnvelopeMatchesOpenSslAssemblyForEachDrop) {
   std::string opened, error;
   ASSERT_TRUE(server::openEnvelope(text(out), encKey(), 512, &opened, &error)) << error;
   EXPECT_EQ(opened, content);
-}
-
-TEST_F(KnownRandom, RsaHelpersMatchOpenSslRawRsa) {
-  const std::string modulus = appKey().modulusHex();
-  const std::string message = "hello, world";
-  const Bytes m = bytesOf(message);
-  SecureBuffer out;
-  // PKCS#1 type 2, and "Keyou": two ASCII digits of the length, the message, filler to k bytes.
-  auto pkcs1 = [&] { return opensslRawEncrypt(appKey(), pkcs1Block(gRequests.back(), m)); };
-  auto keyou = [&] { return opensslRawEncrypt(appKey(), withFiller(bytesOf("12" + message), gRequests.back(), {})); };
-  ASSERT_EQ(pkcs1RsaHex(modulus.c_str(), m.data(), m.size(), &out), 0);
-  EXPECT_EQ(text(out), upperHex(pkcs1()));
-  ASSERT_EQ(pkcs1RsaBinary(modulus.c_str(), m.data(), m.size(), &out), 0);
-  EXPECT_EQ(Bytes(out.data(), out.data() + out.size()), pkcs1());
-  ASSERT_EQ(pkcs1RsaBase64(modulus.c_str(), m.data(), m.size(), &out), 0);
-  EXPECT_EQ(text(out), opensslBase64(pkcs1()));
-  ASSERT_EQ(keyouRsaHex(modulus.c_str(), m.data(), m.size(), &out), 0);
-  ASSERT_EQ(gRequests.back().size(), 128u - 2 - m.size());
-  EXPECT_EQ(text(out), upperHex(keyou()));
-  ASSERT_EQ(keyouRsaBase64(modulus.c_str(), m.data(), m.size(), &out), 0);
-  EXPECT_EQ(text(out), opensslBase64(keyou()));
 }
 
 // ---- the system source, its calls faked: each read gives at most the count its script names

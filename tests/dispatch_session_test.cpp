@@ -1,16 +1,12 @@
-// The session's output end to end: text typed by touches (or placed through a ContentGuard),
-// contentOutput with types 48 and 47 under the built-in default modulus, opened with the
-// private half of that key (tests/data/builtin_default_key.pem); the encrypted PIN code checked
-// against OpenSSL's RC4 keyed with OpenSSL's SHA-1 of the challenge. The content must rest
-// sealed after every call.
+// The session's output end to end: text typed by touches, contentOutput under the built-in
+// default modulus, opened with the private half of that key (crypto_rsa_test checks the pair).
+// The content must rest sealed after every call. (The JVM suite covers the other outputs, the
+// encrypted PIN code and lastError through the native entry points.)
 #include <gtest/gtest.h>
 
-#include <cstring>
 #include <string>
 #include <tuple>
 
-#include "crypto/error_table.h"
-#include "crypto/moduli.h"
 #include "server/envelope.h"
 #include "session/output.h"
 #include "session/session.h"
@@ -26,16 +22,6 @@ constexpr int kWidth = 1080, kHeight = 720;
 class SessionOutput : public ::testing::Test {
  protected:
   SessionOutput() : kb_("dispatch-output", kWidth, kHeight) {}
-  void SetUp() override {
-    ASSERT_EQ(std::string(builtinDefaultModulus()), testKey("builtin_default_key.pem").modulusHex())
-        << "tests/data/builtin_default_key.pem is not the built-in default key";
-  }
-  void place(const std::string& text) {
-    ContentGuard guard(*kb_.session().content);
-    std::memset(guard.text(), 0, kContentBufferSize);
-    std::memcpy(guard.text(), text.data(), text.size());
-    kb_.session().content->length = static_cast<std::uint16_t>(text.size());
-  }
   // contentOutput, its error code, and the content still sealed afterwards.
   SecureBuffer output(int type, const char* timestamp, int expectedError = 0) {
     const std::string before = kb_.text();
@@ -65,7 +51,7 @@ TEST_F(SessionOutput, TypedTextComesOutInTheEnvelope) {
   const server::Opened empty = open(48, output(48, "1700000003"));
   EXPECT_EQ(empty.strength, 'E');
   EXPECT_EQ(empty.payload, "");
-  ASSERT_TRUE(Typist(kb_.session(), KeyGrid(kWidth, kHeight), KeyMap::standard()).type("Kqhzmw7"));
+  ASSERT_TRUE(Typist(kb_.session(), KeyGrid(kWidth, kHeight)).type("Kqhzmw7"));
   ASSERT_EQ(kb_.text(), "Kqhzmw7");
   const server::Opened opened = open(48, output(48, "1700000000"));
   EXPECT_EQ(opened.strength, 'M');  // letters and a digit, no repeats: numeric-aware rating
@@ -78,40 +64,11 @@ TEST_F(SessionOutput, TypedTextComesOutInTheEnvelope) {
     EXPECT_EQ(hashed.payload, expectedSaltedHash("Kqhzmw7", salt, mode)) << setting;
     EXPECT_EQ(hashed.strength, 'M') << setting;
   }
-}
-
-TEST_F(SessionOutput, PinContentNeedsTheEncryptionKeyAndErrorsLandInLastError) {
-  place("739182");
-  setHashRandom(kb_.session(), "1:");  // too short: ignored, no suffix
-  EXPECT_EQ(open(48, output(48, "1")).payload, "739182") << "type 48 needs only the application key";
   output(48, nullptr, 4);
-  EXPECT_STREQ(lastErrorText(kb_.session().content->lastError), "The timestamp is missing!");
-  setHashRandom(kb_.session(), "1:salt");
-  output(47, "1700000002", 2);
+  output(47, "1700000002", 2);  // type 47 needs the encryption key too
   const std::string enc = encKey().modulusHex();
   setEncryPlat(kb_.session(), enc.c_str(), false);
-  const server::Opened opened = open(47, output(47, "1700000002"));
-  EXPECT_EQ(opened.content, expectedSaltedHash("739182", "salt", 'S'));
-  EXPECT_EQ(opened.strength, 'W');  // all digits: numeric-aware rating
-}
-
-TEST_F(SessionOutput, EncryptedPinCodeIsRc4UnderSha1OfTheChallenge) {
-  ContentStore& store = *kb_.session().content;
-  EXPECT_FALSE(encryptedPinCode(kb_.session()));
-  EXPECT_EQ(store.lastError, 100);
-  setChallengeCode(kb_.session(), "ch4llenge-0042");
-  EXPECT_FALSE(encryptedPinCode(kb_.session())) << "empty content";
-  EXPECT_EQ(store.lastError, 101);
-  for (const std::string& text : {std::string("739182"), std::string("Kqhzmw7 with space"), std::string(300, 'a')}) {
-    place(text);
-    const SecureBuffer code = encryptedPinCode(kb_.session());
-    ASSERT_TRUE(code);
-    EXPECT_EQ(store.lastError, 0);
-    const Bytes expected = opensslRc4(opensslSha1("ch4llenge-0042"), bytesOf(text));
-    EXPECT_EQ(std::string(code.c_str(), code.size()), opensslBase64(expected));
-    EXPECT_EQ(kb_.restingBuffer().find(text), std::string::npos) << "content left unsealed";
-    EXPECT_EQ(kb_.text(), text);
-  }
+  EXPECT_EQ(open(47, output(47, "1700000002")).content, expectedSaltedHash("Kqhzmw7", "r4nd0m", 'F'));
 }
 
 }  // namespace

@@ -1,12 +1,7 @@
-# Labels for cross builds whose suites run through CMAKE_CROSSCOMPILING_EMULATOR (the aarch64
-# run of tools/run_aarch64_tests.sh, under user-mode QEMU):
-#   noemu  suites that cannot run there: jvm_suite (the host's x86-64 JVM cannot load an aarch64
-#          libTesselVIP.so) and window_demo (its script starts the demo binary directly, with no
-#          emulator in between);
-#   gpu    suites that render on Mesa's GLES 1.1 (llvmpipe, itself emulated): they pass, but take
-#          most of the run's time; `ctest -LE gpu` gives a quick pass without them.
-# The labels are appended at the end of this directory, once every suite, including those of
-# the other scripts here, has been added.
+# Labels for cross builds run through CMAKE_CROSSCOMPILING_EMULATOR (tools/run_aarch64_tests.sh):
+# noemu marks suites that cannot run there (the host JVM cannot load an aarch64 library; the
+# window demo's script starts its binary directly); gpu marks the Mesa-rendering suites, which
+# pass but take most of the run (`ctest -LE gpu` skips them). Appended once every suite exists.
 if(NOT CMAKE_CROSSCOMPILING)
   return()
 endif()

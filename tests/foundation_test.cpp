@@ -1,12 +1,10 @@
-// Error table texts, the debug dump format and the wipe primitive. (The random source is driven
-// in dispatch_envelope_test, RC4 against OpenSSL in crypto_rc4_test.)
+// Error table texts and the wipe primitive. (The random source is driven in dispatch_envelope_test,
+// freed memory scanned for what wiping should have removed in hygiene_test.)
 #include <gtest/gtest.h>
 
-#include <cstring>
-#include <string>
+#include <utility>
 #include <vector>
 
-#include "crypto/debug_dump.h"
 #include "crypto/error_table.h"
 #include "crypto/wipe.h"
 
@@ -52,13 +50,6 @@ TEST(ErrorTable, ExactMessages) {
       {127, "Unknown error"}, {-128, kMissing}};
   for (const auto& [code, text] : session) EXPECT_STREQ(lastErrorText(code), text) << code;
   EXPECT_STRNE(lastErrorText(103), "Unknown error");
-}
-
-TEST(DebugDump, Formats) {
-  const unsigned char data[9] = {0x00, 0x01, 0x0A, 0xAB, 0xFF, 0x10, 0x7F, 0x80, 0x05};
-  EXPECT_EQ(formatDebugDump("key", data, 9), "key:\n\n0X0\t0X1\t0XA\t0XAB\t0XFF\t0X10\t0X7F\t0X80\t\n0X5\t\n");
-  EXPECT_EQ(formatDebugDump("text", "hello", -1), "text:\nhello\n\n");
-  EXPECT_EQ(formatDebugDump("none", data, 0), "none:\n\n");
 }
 
 TEST(Wipe, ZeroesExactlyTheRange) {

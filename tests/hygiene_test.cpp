@@ -2,16 +2,11 @@
 // memory, in plain, hex or salted-hash form, by typing, any output operation or destroy; and
 // between operations the content buffer must hold only the sealed bytes.
 //
-// This executable replaces malloc/free/calloc/realloc (the four that glibc requires of a
-// replacement) with thin wrappers over glibc's __libc_* entry points. While a scan is
-// armed, free() looks through the whole usable size of the block for a fixed set of needles
-// before handing it back, and records every hit with its backtrace. The needles and the
-// password live in static arrays, and the test itself never copies them to the heap (the typist
-// gets one-character strings, which stay in the std::string's inline buffer).
-//
-// A sanitizer owns malloc, so under ASan/TSan the wrappers are compiled out and the tests skip;
-// CTest labels this suite nosan (tests/hygiene.cmake), which keeps it out of the valgrind
-// run too. The first test proves that the scan is live.
+// This executable replaces malloc/free/calloc/realloc with wrappers over glibc's __libc_* entry
+// points; while a scan is armed, free() searches the block's whole usable size for the needles
+// and records each hit with its backtrace. Needles and password live in static arrays only (the
+// typist gets one-character strings, kept inline by std::string). A sanitizer owns malloc, so
+// there the wrappers are compiled out and the tests skip (label nosan, tests/hygiene.cmake).
 #include <gtest/gtest.h>
 #include <openssl/evp.h>
 
@@ -20,7 +15,6 @@
 
 #include <atomic>
 #include <cstdint>
-#include <cstdio>
 #include <cstdlib>
 #include <cstring>
 #include <functional>
@@ -145,19 +139,11 @@ constexpr int kWidth = 1080, kHeight = 720;
 // Static copies of what the tests compare results with.
 char g_md5Hex[33];
 
-void lowerHex(const unsigned char* in, std::size_t n, char* out) {
-  static const char kDigits[] = "0123456789abcdef";
+void hexInto(const void* in, std::size_t n, char* out, const char* digits = "0123456789abcdef") {
   for (std::size_t i = 0; i < n; ++i) {
-    out[2 * i] = kDigits[in[i] >> 4];
-    out[2 * i + 1] = kDigits[in[i] & 15];
-  }
-}
-
-void upperHex(const unsigned char* in, std::size_t n, unsigned char* out) {
-  static const char kDigits[] = "0123456789ABCDEF";
-  for (std::size_t i = 0; i < n; ++i) {
-    out[2 * i] = static_cast<unsigned char>(kDigits[in[i] >> 4]);
-    out[2 * i + 1] = static_cast<unsigned char>(kDigits[in[i] & 15]);
+    const unsigned char b = static_cast<const unsigned char*>(in)[i];
+    out[2 * i] = digits[b >> 4];
+    out[2 * i + 1] = digits[b & 15];
   }
 }
 
@@ -184,13 +170,13 @@ void opensslMd5(const void* data, std::size_t n, unsigned char out[16]) {
 void buildNeedles() {
   g_needleCount.store(0);
   addNeedle("password (first 8 characters)", kPassword, 8);
-  unsigned char hex[kMaxNeedle];
-  upperHex(reinterpret_cast<const unsigned char*>(kPassword), 8, hex);
+  char hex[16];
+  hexInto(kPassword, 8, hex, "0123456789ABCDEF");
   addNeedle("password as upper-case hex", hex, 16);
 
   unsigned char md5[16];
   opensslMd5(kPassword, kPasswordLength, md5);
-  lowerHex(md5, 16, g_md5Hex);
+  hexInto(md5, 16, g_md5Hex);
   g_md5Hex[32] = 0;
   addNeedle("MD5(password), lower-case hex", g_md5Hex, 32);
 
@@ -200,7 +186,7 @@ void buildNeedles() {
   unsigned char md5Salted[16];
   opensslMd5(salted, 32 + sizeof kSalt - 1, md5Salted);
   char saltedHex[32];
-  lowerHex(md5Salted, 16, saltedHex);
+  hexInto(md5Salted, 16, saltedHex);
   addNeedle("MD5(md5hex || salt), hex digits 8..24", saltedHex + 8, 16);
 }
 
@@ -292,7 +278,7 @@ class Hygiene : public ::testing::Test {
 
   // Types the password one character at a time (no heap copy of it in the test).
   void typePassword(KeyboardSession& s) {
-    Typist typist(s, KeyGrid(kWidth, kHeight), KeyMap::standard());
+    Typist typist(s, KeyGrid(kWidth, kHeight));
     for (std::size_t i = 0; i < kPasswordLength; ++i) {
       ASSERT_TRUE(typist.type(std::string(1, kPassword[i])));
     }
@@ -309,16 +295,6 @@ TEST_F(Hygiene, ScannerSeesANeedleInAFreedBlock) {
   g_hitCount.store(0);
   g_armed.store(true);
   std::free(block);
-  g_armed.store(false);
-  EXPECT_EQ(g_hitCount.load(), 1);
-  EXPECT_GT(g_scannedBlocks.load(), 0);
-  // std::string's heap buffer goes through operator delete: scanned too.
-  {
-    std::string s(g_md5Hex, 32);
-    s.append(100, 'y');
-    g_hitCount.store(0);
-    g_armed.store(true);
-  }
   g_armed.store(false);
   EXPECT_EQ(g_hitCount.load(), 1);
   g_hitCount.store(0);
@@ -339,7 +315,7 @@ TEST_F(Hygiene, TypedPasswordNeverReachesFreedHeap) {
     ScanScope scan("typing (with one character deleted)");
     typePassword(s);
     // A typo and its deletion: the delete path reseals too.
-    Typist typist(s, KeyGrid(kWidth, kHeight), KeyMap::standard());
+    Typist typist(s, KeyGrid(kWidth, kHeight));
     ASSERT_TRUE(typist.type(std::string(1, 'j')));
     ASSERT_EQ(typist.tap(KeyGrid(kWidth, kHeight).deleteKey()), 0);
   }
@@ -384,9 +360,9 @@ TEST_F(Hygiene, TypedPasswordNeverReachesFreedHeap) {
   EXPECT_EQ(sessionAt(handle), nullptr);
 }
 
-TEST_F(Hygiene, ClearAndEvictionLeaveNothingBehind) {
-  // Clearing through the number pad's clear key, then typing again and losing the session to
-  // eviction by 20 newer ones: both paths free or wipe without leaving the text.
+// Clearing through the number pad's clear key wipes in place. (A session lost to eviction is
+// freed by the same routine as destroy, scanned above.)
+TEST_F(Hygiene, ClearLeavesNothingBehind) {
   const int handle = createKeyboard("hygiene-clear");
   ASSERT_GE(handle, 0);
   KeyboardSession& s = *sessionAt(handle);
@@ -394,29 +370,10 @@ TEST_F(Hygiene, ClearAndEvictionLeaveNothingBehind) {
   {
     ScanScope scan("clear on the number pad");
     setKbdType(s, 2);
-    Typist pad(s, KeyGrid(kWidth, kHeight), KeyMap::standard());
-    ASSERT_EQ(pad.tap(KeyGrid(kWidth, kHeight).padCell(1, 3)), 0);
+    ASSERT_EQ(Typist(s, KeyGrid(kWidth, kHeight)).tap(KeyGrid(kWidth, kHeight).padCell(1, 3)), 0);
   }
   expectSealed(s, 0, "clear");
-  setKbdType(s, 0);
-  typePassword(s);
-  expectSealed(s, kPasswordLength, "typing again");
-
-  // Fresh names fill the free slots first; once all twenty are taken each create evicts one.
-  const auto stillOurs = [&] {
-    const KeyboardSession* now = sessionAt(handle);
-    return now != nullptr && now->sessionName != nullptr && std::strcmp(now->sessionName, "hygiene-clear") == 0;
-  };
-  char name[32];
-  {
-    ScanScope scan("eviction by newer sessions");
-    for (int i = 0; i < 2 * kSessionSlots && stillOurs(); ++i) {
-      std::snprintf(name, sizeof name, "hygiene-evictor-%d", i);
-      ASSERT_GE(createSession(name), 0);
-    }
-  }
-  EXPECT_FALSE(stillOurs());
-  for (int slot = 0; slot < kSessionSlots; ++slot) destroySession(slot);
+  destroySession(handle);
 }
 
 }  // namespace

@@ -1,10 +1,8 @@
-// Key layout building, shuffling, masking, rebuild rules and surface geometry.
-//
-// The expected layout texts are written out here independently of the library's own tables.
-// glibc's lrand48/srand48 serve as the oracle for the generator draws and the reseeding.
+// Key layout building, masking, reseeding and surface geometry. The expected layout texts are
+// written out here independently of the library's own tables; glibc's lrand48/srand48 serve as
+// the oracle for the reseeding. (Rebuild rules: input_touch_test; shuffles: typing and random.)
 #include <gtest/gtest.h>
 
-#include <algorithm>
 #include <cmath>
 #include <cstdlib>
 #include <ctime>
@@ -13,15 +11,10 @@
 #include "input/layout.h"
 #include "input/rand48.h"
 #include "session/session.h"
+#include "support/keyboard_typist.h"
 
 namespace tessel {
 namespace {
-
-const char* const kLetters[3] = {"qwertyuiop", "asdfghjkl", "zxcvbnm"};
-const char* const kLower[3] = {"1234567890", "`~!@#$%^&", "*()-_=+"};
-const char* const kUpper[3] = {"1234567890", "{}[]\\|:;'", "\",.<>/?"};
-constexpr int kRowStart[3] = {0, 10, 19};
-constexpr int kRowLength[3] = {10, 9, 7};
 
 class LayoutTest : public ::testing::Test {
  protected:
@@ -32,79 +25,24 @@ class LayoutTest : public ::testing::Test {
   }
   void TearDown() override { destroySession(handle_); }
 
-  std::string row(const RelaxedField<std::uint8_t>* table, int r) const {
-    std::string out;
-    for (int i = 0; i < kRowLength[r]; ++i) out += static_cast<char>(static_cast<std::uint8_t>(table[kRowStart[r] + i] + s_->keyMask));
-    return out;
-  }
-  std::string pad() const {
-    std::string out;
-    for (auto& b : s_->padDigits) out += static_cast<char>(static_cast<std::uint8_t>(b + s_->keyMask));
-    return out;
-  }
-  std::string snapshot() const {
-    std::string out;
-    for (auto& b : s_->letters) out += static_cast<char>(b.load());
-    for (auto& b : s_->symbolsLower) out += static_cast<char>(b.load());
-    for (auto& b : s_->symbolsUpper) out += static_cast<char>(b.load());
-    for (auto& b : s_->padDigits) out += static_cast<char>(b.load());
-    return out;
-  }
-
   int handle_ = -1;
   KeyboardSession* s_ = nullptr;
 };
+
+std::string allKeys(const test::KeyMap& m) { return m.letters + m.symbolsLower + m.symbolsUpper + m.padDigits; }
 
 // The stored bytes are the characters minus the mask: unmasked they read as the standard layout.
 TEST_F(LayoutTest, UnshuffledTablesReadAsTheStandardLayout) {
   s_->kbdPage = 1;
   s_->keyReleased[4] = 0;
-  const std::string standard = std::string(kLetters[0]) + kLetters[1] + kLetters[2] + kLower[0] + kLower[1] +
-                               kLower[2] + kUpper[0] + kUpper[1] + kUpper[2] + "1234567890";
   for (int mask : {0, 31}) {
-    SCOPED_TRACE("mask " + std::to_string(mask));
     s_->keyMask = static_cast<std::uint8_t>(mask);
     s_->layoutBuilt = 0;
     buildLayout(*s_);
-    std::string unmasked;
-    for (int r = 0; r < 3; ++r) unmasked += row(s_->letters, r);
-    for (int r = 0; r < 3; ++r) unmasked += row(s_->symbolsLower, r);
-    for (int r = 0; r < 3; ++r) unmasked += row(s_->symbolsUpper, r);
-    EXPECT_EQ(unmasked + pad(), standard);
+    EXPECT_EQ(allKeys(test::KeyMap::fromSession(*s_)), allKeys(test::KeyMap::standard())) << "mask " << mask;
   }
   EXPECT_EQ(s_->symbolPage, 1u);
   EXPECT_EQ(s_->keyReleased[4], 1u);
-}
-
-// The draws are n transpositions per row, a before b, rows in a fixed order; glibc's lrand48
-// replays them here.
-TEST_F(LayoutTest, ShuffleDrawsFollowTheGeneratorInRowOrder) {
-  s_->kbdRandom = 1;
-  ::srand48(4242);
-  buildLayout(*s_);
-  ::srand48(4242);
-  auto shuffled = [](std::string keys) {
-    const long n = static_cast<long>(keys.size());
-    for (long i = 0; i < n; ++i) {
-      const long a = ::lrand48() % n;
-      const long b = ::lrand48() % n;
-      std::swap(keys[a], keys[b]);
-    }
-    return keys;
-  };
-  std::string letters[3], lower[3], upper[3];
-  for (int r = 0; r < 3; ++r) letters[r] = shuffled(kLetters[r]);
-  for (int r = 0; r < 3; ++r) lower[r] = shuffled(kLower[r]);
-  const std::string padDigits = shuffled("1234567890");
-  for (int r = 1; r < 3; ++r) upper[r] = shuffled(kUpper[r]);
-  for (int r = 0; r < 3; ++r) {
-    EXPECT_EQ(row(s_->letters, r), letters[r]);
-    EXPECT_EQ(row(s_->symbolsLower, r), lower[r]);
-  }
-  EXPECT_EQ(row(s_->symbolsUpper, 0), lower[0]);
-  EXPECT_EQ(row(s_->symbolsUpper, 1), upper[1]);
-  EXPECT_EQ(row(s_->symbolsUpper, 2), upper[2]);
-  EXPECT_EQ(pad(), padDigits);
 }
 
 TEST_F(LayoutTest, GeneratorIsReseededWithTheTimeAfterTheBuild) {
@@ -118,21 +56,6 @@ TEST_F(LayoutTest, GeneratorIsReseededWithTheTimeAfterTheBuild) {
     matched = matched || ::lrand48() == next;
   }
   EXPECT_TRUE(matched);
-}
-
-TEST_F(LayoutTest, RebuildsOnlyAfterLayoutBuiltIsCleared) {
-  s_->kbdRandom = 1;
-  buildLayout(*s_);
-  const std::string first = snapshot();
-  s_->kbdPage = 1;
-  s_->keyMask = static_cast<std::uint8_t>((s_->keyMask + 1) & 31);
-  buildLayout(*s_);  // a second surface creation
-  EXPECT_EQ(snapshot(), first);
-  EXPECT_EQ(s_->symbolPage, 0u);
-  s_->layoutBuilt = 0;
-  buildLayout(*s_);
-  EXPECT_NE(snapshot(), first);
-  EXPECT_EQ(s_->symbolPage, 1u);
 }
 
 // Variant 0 forces four rows, 1 keeps the row count, 2 picks 1 after keys of exactly 0.6 width to

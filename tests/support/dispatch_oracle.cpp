@@ -37,11 +37,10 @@ const server::PrivateKey& testKey(const std::string& fileName) {
 }
 
 Bytes opensslBase64Decode(const std::string& text) {
-  if (text.size() % 4 != 0) throw std::runtime_error("base64 length");
   Bytes out(text.size() / 4 * 3 + 1);
   const int n = EVP_DecodeBlock(out.data(), reinterpret_cast<const unsigned char*>(text.data()),
                                 static_cast<int>(text.size()));
-  if (n < 0) throw std::runtime_error("base64");
+  if (n < 0 || text.size() % 4 != 0) throw std::runtime_error("base64");
   // EVP_DecodeBlock keeps the bytes that "=" padding stands for; drop them.
   std::size_t pad = 0;
   if (!text.empty() && text.back() == '=') ++pad;

@@ -1,7 +1,5 @@
-// OpenSSL-backed oracles for the RSA, dispatcher and server-side suites (test-only): the suites'
-// private keys, raw and PKCS#1 RSA by OpenSSL under them, an envelope assembled from its parts,
-// and a run of the tessel_open command line in a child process. The primitive oracles come from
-// openssl_oracle.h.
+// OpenSSL-backed oracles for the RSA, dispatcher and server-side suites: their private keys, RSA
+// by OpenSSL, an envelope assembled from its parts, and tessel_open run in a child process.
 #pragma once
 
 #include <cstdint>
