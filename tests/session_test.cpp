@@ -111,14 +111,3 @@ TEST_F(SessionTable, SealClearAndLength) {
   EXPECT_EQ(contentLength(*s), -32767);
   s->content->length = 0;
 }
-
-TEST(OwnedText, Replacement) {
-  char* field = nullptr;
-  for (const char* text : {"first", "second"}) {
-    EXPECT_TRUE(replaceOwnedText(field, text));
-    EXPECT_STREQ(field, text);
-  }
-  EXPECT_TRUE(replaceOwnedText(field, nullptr));
-  EXPECT_EQ(field, nullptr);
-  releaseOwnedText(field);
-}
