@@ -1,7 +1,5 @@
-// Artwork properties the renderer relies on, for the theme linked in: transparent outside the
-// sampled part, held faces that stand out, glyph strokes that survive nearest-neighbour
-// minification, one letter height, one label size. Which picture sits on which key is checked
-// on the drawn surfaces (render_surface_test).
+// Artwork properties the renderer relies on, for the theme linked in. Which picture sits on which
+// key is checked on the drawn surfaces (render_surface_test).
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -16,13 +14,10 @@ namespace {
 
 using namespace images;
 
-std::uint8_t alphaAt(const TextureImage& img, int x, int y) {
-  return img.pixels[(static_cast<std::size_t>(y) * img.width + x) * 4 + 3];
-}
+std::uint8_t alphaAt(const TextureImage& img, int x, int y) { return img.pixels[(static_cast<std::size_t>(y) * img.width + x) * 4 + 3]; }
 
-// Key faces are sampled only in part (texture-coordinate sets square, shift, bar, wide): the
-// rest of each image must be transparent and the centre of the sampled part opaque; the held
-// picture of each pair must stand out from the released one at a glance.
+// Key faces are sampled only in part (the texture-coordinate sets): the rest of each image must be
+// transparent, the sampled part's centre opaque, and the held face must stand out at a glance.
 TEST(Artwork, KeyFacesLiveWhereSampledAndHeldFacesStandOut) {
   struct Pair {
     const char* name;
@@ -30,10 +25,8 @@ TEST(Artwork, KeyFacesLiveWhereSampledAndHeldFacesStandOut) {
     double s, t;  // sampled fraction of width and height
   } pairs[] = {{"char", kCharKeys[0], kCharKeys[1], 0.625, 0.625},
                {"shift/delete", kShiftDeleteKeys[0], kShiftDeleteKeys[1], 0.9375, 0.625},
-               {"switch", kSwitchKeys[0], kSwitchKeys[1], 0.9765, 0.625},
-               {"done", kDoneKeys[0], kSwitchKeys[1], 0.9765, 0.625},
-               {"space", kSpaceKeys[0], kSpaceKeys[1], 1.0, 0.625},
-               {"pad", kPadKeys[0], kPadKeys[1], 1.0, 1.0},
+               {"switch", kSwitchKeys[0], kSwitchKeys[1], 0.9765, 0.625}, {"done", kDoneKeys[0], kSwitchKeys[1], 0.9765, 0.625},
+               {"space", kSpaceKeys[0], kSpaceKeys[1], 1.0, 0.625}, {"pad", kPadKeys[0], kPadKeys[1], 1.0, 1.0},
                {"pad done", kPadDoneKeys[0], kPadDoneKeys[1], 1.0, 1.0}};
   for (const Pair& p : pairs) {
     SCOPED_TRACE(p.name);
@@ -62,10 +55,9 @@ std::pair<int, int> inkRows(const TextureImage& img) {
   return {top, bottom};
 }
 
-// Every glyph has ink, stays inside its image with a margin (clamp-to-edge would smear an edge
-// pixel), and its thinnest strokes keep 4 texels so that a 2x nearest minification (surface
-// mode 0) keeps them: at 90% of the ink, the shorter of the horizontal and vertical runs through
-// the texel is at least 4 (the rest are stroke ends and joins).
+// Every glyph has ink, a margin (clamp-to-edge would smear an edge pixel), and strokes that survive
+// a 2x nearest minification (surface mode 0): for 90% of the ink, the shorter of the horizontal
+// and vertical runs through the texel is at least 4 (the rest are stroke ends and joins).
 TEST(Artwork, GlyphsHaveInkMarginsAndThickStrokes) {
   for (const ImageGroup* g : {&kLetterGlyphs, &kShiftedLetterGlyphs, &kSymbolGlyphs, &kSymbolShiftGlyphs}) {
     for (int i = 0; i < g->count; ++i) {
@@ -117,9 +109,8 @@ TEST(Artwork, LabelsStandAtOneVisualSize) {
     const char* name;
     const TextureImage& img;
     double pxPerTexel;
-  } labels[] = {{"ABC", kLabels[0], 0.9},      {"?123", kLabels[1], 0.9},     {"Done", kLabels[2], 1.01},
-                {"Done held", kLabels[3], 1.01}, {"123", kLabels[4], 0.9},      {"Clear", kPadLabels[0], 0.95},
-                {"OK", kPadLabels[1], 0.95},     {"#+=", kIcons[3], 1.125}};
+  } labels[] = {{"ABC", kLabels[0], 0.9}, {"?123", kLabels[1], 0.9}, {"Done", kLabels[2], 1.01}, {"Done held", kLabels[3], 1.01},
+                {"123", kLabels[4], 0.9}, {"Clear", kPadLabels[0], 0.95}, {"OK", kPadLabels[1], 0.95}, {"#+=", kIcons[3], 1.125}};
   for (const Label& l : labels) {
     const auto rows = inkRows(l.img);
     EXPECT_NEAR((rows.second - rows.first + 1) * l.pxPerTexel, 30, 6) << l.name;

@@ -1,8 +1,6 @@
-// The three surfaces drawn by Mesa's GLES 1.1 (llvmpipe, offscreen) and read back. Every keyboard
-// state is compared key region by key region with its reviewed picture (docs/screenshots/<theme>/,
-// shown by the README): a wrong, moved or resized picture fails naming the key and what it should
-// show. Shuffled glyphs are recognised against the embedded ones; the cursor blinks on a test clock.
-// TESSEL_UPDATE_SCREENSHOTS=1 rewrites the pictures instead: review each change before committing.
+// The three surfaces drawn by Mesa's GLES 1.1 offscreen and read back. Every keyboard state is
+// compared key by key with its reviewed picture (docs/screenshots/<theme>/), so a failure names the
+// key and what it should show. TESSEL_UPDATE_SCREENSHOTS=1 rewrites the pictures: review each change.
 #include <gtest/gtest.h>
 
 #include <GLES/gl.h>
@@ -43,15 +41,6 @@ struct Shot {
 
 Shot grab(const GlesContext& gl) { return glFinish(), Shot{gl.width(), gl.height(), gl.readRgba()}; }
 
-// Several surfaces one above the other, as the app stacks its views.
-Shot stack(const std::vector<Shot>& shots) {
-  Shot out{shots[0].w, 0, {}};
-  for (const Shot& s : shots) out.h += s.h, out.px.insert(out.px.end(), s.px.begin(), s.px.end());
-  return out;
-}
-
-// ---- sessions on offscreen surfaces
-
 std::int64_t gNow = 0;  // the test clock, microseconds
 
 struct Scene {
@@ -86,10 +75,7 @@ class Keyboard {
     ContentGuard guard(*s->content);
     std::fill_n(guard.text(), n, 'x'), guard.text()[n] = 0, s->content->length = static_cast<std::uint16_t>(n);
   }
-  char charAt(const RelaxedField<std::uint8_t>* table, int i) const {
-    return static_cast<char>(static_cast<std::uint8_t>(table[i] + s->keyMask));
-  }
-
+  char charAt(const RelaxedField<std::uint8_t>* table, int i) const { return static_cast<char>(table[i] + s->keyMask); }
   GlesContext gl;
   int w, h, handle = -1;
   KeyboardSession* s = nullptr;
@@ -117,14 +103,11 @@ class PopUps {
     for (int k = 0; k < 3 && !cursorShown(f); ++k) gNow += 850000, f = drawField();
     return f;
   }
-
   GlesContext field, top;
 
  private:
   Keyboard& kb_;
 };
-
-// ---- every state, key by key, against its reviewed picture
 
 struct Region {
   std::string key, picture;
@@ -135,7 +118,7 @@ struct State {
   const char* name;
   Scene setup;
   double holdX, holdY;  // centre of the held key's cell; negative: none
-  const char* functionKeys;  // pictures of the function keys, in the order of functionRegions
+  const char* functionKeys;  // pictures of the function keys, in the order regionsOf names them
   int length = -1;           // >= 0: the field and top pop-ups are drawn above the keyboard
 };
 
@@ -212,10 +195,6 @@ std::vector<Region> regionsOf(const State& st, Keyboard& kb) {
   return out;
 }
 
-std::string referencePath(const std::string& name) {
-  return std::string(TESSEL_SOURCE_DIR "/docs/screenshots/") + TESSEL_TEST_THEME + "/" + name + ".png";
-}
-
 // Pixels inside [x0, x1) x [y0, y1) that differ clearly from the reviewed picture.
 int differing(const Shot& a, const Shot& b, int x0, int y0, int x1, int y1) {
   int n = 0;
@@ -240,20 +219,25 @@ TEST(KeyPictures, EveryStateShowsTheReviewedPictureOnEveryKey) {
       shots = {st.length > 0 ? pops->fieldWithCursor() : pops->drawField(false), pops->drawTop()};
     }
     shots.push_back(kb.draw());
-    const Shot shot = stack(shots);
+    Shot shot{kb.w, 0, {}};  // the pop-ups stacked above the keyboard, as the app lays out its views
+    for (const Shot& s : shots) {
+      shot.h += s.h;
+      shot.px.insert(shot.px.end(), s.px.begin(), s.px.end());
+    }
     const int top = shot.h - kb.h;  // the keyboard's first row in the stacked picture
-    if (update && test::writePng(referencePath(st.name), shot.w, shot.h, shot.px)) continue;
+    const std::string path = std::string(TESSEL_SOURCE_DIR "/docs/screenshots/") + TESSEL_TEST_THEME + "/" + st.name + ".png";
+    if (update && test::writePng(path, shot.w, shot.h, shot.px)) continue;
     Shot ref;
-    ASSERT_TRUE(test::readPng(referencePath(st.name), ref.w, ref.h, ref.px)) << "no reviewed " << referencePath(st.name);
+    ASSERT_TRUE(test::readPng(path, ref.w, ref.h, ref.px)) << "no reviewed " << path;
     ASSERT_EQ(ref.w * 10000 + ref.h, shot.w * 10000 + shot.h) << "size of the reviewed picture";
     std::vector<Region> regions = regionsOf(st, kb);
     const double cols = st.setup.type == 0 ? 10 : 4, cw = kb.w / cols, ch = kb.h / 4.0;
     if (top > 0) {  // the pop-ups: the field with its dots and cursor, and the top pop-up
-      regions.push_back({"field", st.length > 0 ? std::to_string(std::min(st.length, st.setup.type ? 18 : 19)) + " dots" : "balloon only",
-                         0, -2 * kPopH / ch, cols, -kPopH / ch});
-      if (st.length > 0) {  // the cursor, one grid unit (a fortieth of the width) right of the last dot
-        const int dots = std::min(st.length, st.setup.type ? 18 : 19);
-        const double x = cols * (0.5 + (2 * dots - (st.setup.type ? 18 : 19)) / 40.0);
+      const int limit = st.setup.type ? 18 : 19;
+      const int dots = std::min(st.length, limit);
+      regions.push_back({"field", dots > 0 ? std::to_string(dots) + " dots" : "balloon only", 0, -2 * kPopH / ch, cols, -kPopH / ch});
+      if (dots > 0) {  // the cursor, one grid unit (a fortieth of the width) right of the last dot
+        const double x = cols * (0.5 + (2 * dots - limit) / 40.0);
         regions.push_back({"cursor", "the cursor", x - cols / 40, -2 * kPopH / ch, x + cols / 40, -kPopH / ch});
       }
       regions.push_back({"top pop-up", st.holdX >= 0 ? "enlarged glyph" : "nothing", 0, -kPopH / ch, cols, 0});
@@ -267,8 +251,6 @@ TEST(KeyPictures, EveryStateShowsTheReviewedPictureOnEveryKey) {
     }
   }
 }
-
-// ---- glyph positions of a shuffled layout, recognised against the embedded glyphs
 
 // Which image of `group` is drawn in the box (pixels): the one whose ink (alpha >= 128) best
 // overlaps the dark pixels read back there (intersection over union).
@@ -314,10 +296,7 @@ TEST(KeyPictures, ShuffledLayoutShowsEachCharacterOnItsKey) {
   }
 }
 
-// ---- the cursor's blink
-
-// The phase flips on the first frame more than 800 ms after the last flip, measured within the
-// second, and only then.
+// The phase flips on the first frame more than 800 ms (within the second) after the last flip.
 TEST(FieldPopUp, CursorBlinksEvery800Milliseconds) {
   Keyboard kb("render-blink", {});
   REQUIRE_GL(kb);
@@ -333,8 +312,7 @@ TEST(FieldPopUp, CursorBlinksEvery800Milliseconds) {
   }
   ASSERT_GE(flips.size(), 3u);
   for (std::size_t k = 1; k < flips.size(); ++k) EXPECT_EQ(flips[k] - flips[k - 1], 17) << "frames between flips";
-  // Seconds later, at exactly 800 ms within the second after the last flip: no change; a
-  // microsecond more: the next flip.
+  // Seconds later, exactly 800 ms within the second after the last flip: no change; 1 us more: a flip.
   const std::int64_t lastFlip = start + 50000LL * flips.back();
   gNow = lastFlip + 800000 + 1000000 * ((gNow - lastFlip) / 1000000 + 2);
   EXPECT_EQ(pops.cursorShown(pops.drawField()), shown);
@@ -342,8 +320,7 @@ TEST(FieldPopUp, CursorBlinksEvery800Milliseconds) {
   EXPECT_NE(pops.cursorShown(pops.drawField()), shown);
 }
 
-// ---- odd states: nothing traps, reads past an array or leaves a GL error
-
+// Odd states: nothing traps, reads past an array or leaves a GL error.
 TEST(OddState, UnbuiltUnsizedAndOutOfRangeStatesAreHarmless) {
   const int handle = createSession("render-unbuilt");
   KeyboardSession* s = sessionAt(handle);

@@ -1,16 +1,39 @@
-// PNG files for test output (screenshots of rendered surfaces), through libpng. Test-only.
+// RGBA8 pixels (top row first) to and from PNG files through libpng's simplified API, for the
+// render suites' reviewed pictures. Every call refuses when the tests are built without libpng.
 #pragma once
 
 #include <cstdint>
 #include <string>
 #include <vector>
 
+#if defined(TESSEL_HAVE_PNG)
+#include <png.h>
+#endif
 namespace tessel::test {
 
-// Writes RGBA8 pixels (top row first) as a PNG. False when libpng is not available to the
-// tests or the file cannot be written.
-bool writePng(const std::string& path, int width, int height, const std::vector<std::uint8_t>& rgba);
-// Reads a PNG as RGBA8, top row first. False when it cannot be read (or without libpng).
-bool readPng(const std::string& path, int& width, int& height, std::vector<std::uint8_t>& rgba);
+#if defined(TESSEL_HAVE_PNG)
+inline bool writePng(const std::string& path, int width, int height, const std::vector<std::uint8_t>& rgba) {
+  png_image image{};
+  image.version = PNG_IMAGE_VERSION;
+  image.format = PNG_FORMAT_RGBA;
+  image.width = static_cast<png_uint_32>(width);
+  image.height = static_cast<png_uint_32>(height);
+  return png_image_write_to_file(&image, path.c_str(), 0, rgba.data(), 0, nullptr) != 0;
+}
+
+inline bool readPng(const std::string& path, int& width, int& height, std::vector<std::uint8_t>& rgba) {
+  png_image image{};
+  image.version = PNG_IMAGE_VERSION;
+  if (!png_image_begin_read_from_file(&image, path.c_str())) return false;
+  image.format = PNG_FORMAT_RGBA;
+  rgba.assign(PNG_IMAGE_SIZE(image), 0);
+  width = static_cast<int>(image.width);
+  height = static_cast<int>(image.height);
+  return png_image_finish_read(&image, nullptr, rgba.data(), 0, nullptr) != 0;
+}
+#else
+inline bool writePng(const std::string&, int, int, const std::vector<std::uint8_t>&) { return false; }
+inline bool readPng(const std::string&, int&, int&, std::vector<std::uint8_t>&) { return false; }
+#endif
 
 }  // namespace tessel::test

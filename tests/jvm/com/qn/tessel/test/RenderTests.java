@@ -8,11 +8,9 @@ import static com.qn.tessel.test.JvmSuite.keyboard;
 import java.util.Arrays;
 
 /**
- * The three GL surfaces driven from Java as an app's renderers drive them: each on its own
- * thread with its own offscreen GLES 1.1 context (Mesa), the touches on the main thread. The
- * pictures themselves are checked key by key in the C++ render suites; these cases check that
- * the settings set through the native methods (kbdMode, popMode, keyboard type, variant) reach
- * the renderer and that every draw entry point draws.
+ * The three GL surfaces driven from Java as an app's renderers drive them, each on its own thread
+ * and offscreen GLES 1.1 context. The pictures are checked key by key in the C++ render suites;
+ * here, that settings set through the native methods reach the renderer and every entry point draws.
  */
 final class RenderTests {
   private RenderTests() {}
@@ -23,15 +21,12 @@ final class RenderTests {
     int differing(Frame o, double x0, double y0, double x1, double y1) {
       int n = 0;
       for (int y = Math.max(0, (int) y0); y < Math.min(height, (int) y1); ++y)
-        for (int x = Math.max(0, (int) x0); x < Math.min(width, (int) x1); ++x) {
-          int at = (y * width + x) * 4;
-          if (!Arrays.equals(rgba, at, at + 4, o.rgba, at, at + 4)) ++n;
-        }
+        for (int at = (y * width + Math.max(0, (int) x0)) * 4; at < (y * width + Math.min(width, (int) x1)) * 4; at += 4)
+          n += Arrays.equals(rgba, at, at + 4, o.rgba, at, at + 4) ? 0 : 1;
       return n;
     }
 
     int differing(Frame o) { return differing(o, 0, 0, width, height); }
-
     boolean allZero() { return differing(new Frame(new byte[rgba.length], width, height)) == 0; }
   }
 
@@ -41,11 +36,10 @@ final class RenderTests {
   }
 
   static void run() throws Exception {
-    try (EglContext main = new EglContext(WIDTH, HEIGHT)) {
+    try (EglContext main = new EglContext(WIDTH, HEIGHT); EglContext pop = new EglContext(WIDTH, 80);
+         EglContext top = new EglContext(96, 160)) {
       mainSurface(main);
-      try (EglContext pop = new EglContext(WIDTH, 80); EglContext top = new EglContext(96, 160)) {
-        popSurfaces(main, pop, top);
-      }
+      popSurfaces(main, pop, top);
     }
   }
 
