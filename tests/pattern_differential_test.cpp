@@ -171,8 +171,7 @@ TEST(PatternDifferential, GeneratedPatternsAgreeWithStdRegex) {
 MatchResult pcreMatch(pcre2_code* code, const std::string& text, bool* limited) {
   pcre2_match_data* data = pcre2_match_data_create_from_pattern(code, nullptr);
   const int rc = pcre2_match(code, reinterpret_cast<PCRE2_SPTR>(text.data()), text.size(), 0, 0, data, nullptr);
-  std::uint32_t groups = 0;
-  pcre2_pattern_info(code, PCRE2_INFO_CAPTURECOUNT, &groups);
+  const std::uint32_t groups = pcre2_get_ovector_count(data) - 1;
   const PCRE2_SIZE* ov = pcre2_get_ovector_pointer(data);
   MatchResult r{1, static_cast<std::int32_t>(groups)};
   for (std::uint32_t i = 0; rc > 0 && i < 2 * (groups + 1); ++i)
