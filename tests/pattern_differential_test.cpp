@@ -48,8 +48,11 @@ class Generator {
   // Random bytes, or the pattern's own literals sampled (matches become common), or those mutated.
   std::string text(const Generated& g, int kind) {
     std::string s;
-    for (int i = kind == 0 ? below(8) : 0; i > 0; --i) s += textByte();
-    for (char c : kind == 0 ? std::string() : g.ours) {
+    if (kind == 0) {
+      for (int i = below(8); i > 0; --i) s += textByte();
+      return s;
+    }
+    for (char c : g.ours) {
       if (std::isalnum(static_cast<unsigned char>(c)) || c == '!' || c == '_' || c == '-') {
         if (chance(70)) s += c;
         if (chance(20)) s += c;

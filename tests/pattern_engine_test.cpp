@@ -190,7 +190,7 @@ TEST(PatternLongText, NoFalseRefusalWithoutBackrefsAtAnyDepth) {
     for (const Row& r : rows) {
       MatchContext ctx;
       EXPECT_EQ(PatternEngine(r.pattern).matches(bytes(r.text), r.text.size(), &ctx), r.expected) << r.pattern;
-      EXPECT_EQ(PatternEngine(r.pattern).matchExact(r.text.data(), r.text.size()).empty(), !r.expected);
+      EXPECT_EQ(PatternEngine(r.pattern).matchExact(r.text.data(), r.text.size()).empty(), !r.expected) << r.pattern;
       EXPECT_FALSE(ctx.gaveUp()) << r.pattern;
     }
   });
