@@ -18,8 +18,7 @@ using namespace tessel;
 
 TEST(FuzzRegression, PatternInputsKeepTheResultContract) {
   int replayed = 0;
-  const std::string dir = std::string(TESSEL_TEST_DATA_DIR) + "/fuzz_regressions";
-  for (const auto& entry : std::filesystem::directory_iterator(dir)) {
+  for (const auto& entry : std::filesystem::directory_iterator(TESSEL_TEST_DATA_DIR "/fuzz_regressions")) {
     const std::string name = entry.path().filename().string();
     if (name == "README.md") continue;
     ASSERT_EQ(name.rfind("pattern-", 0), 0u) << name << ": an input without a replay here";
@@ -38,7 +37,7 @@ TEST(FuzzRegression, PatternInputsKeepTheResultContract) {
       EXPECT_TRUE(r[0] == 1 && r[2] == 0 && r[3] == static_cast<std::int32_t>(text.size()));
     }
     EXPECT_EQ(engine.matches(reinterpret_cast<const std::uint8_t*>(text.data()), text.size()), !r.empty());
-    const char letter = rateStrength(d[1], std::string(text.c_str()).c_str());
+    const char letter = rateStrength(d[1], text.c_str());
     EXPECT_TRUE(letter != 0 && std::strchr("EWMSTR", letter) != nullptr) << letter;
     ++replayed;
   }
