@@ -40,6 +40,12 @@ ROWS = [
     for case, pattern in (("alnum+", "[:alnum:]+"), ("graph{0,16}", "[[:alpha:][:digit:][:punct:]]{0,16}"))
     for n in (8, 64, 512, 4092)
 ] + [
+] + [
+    (f"… a key press as the library now runs it (`{pattern}` compiled once at `setAccepts`), {n} chars",
+     "pattern_bench", f"ours_keypress/{case}/{n}", None, "", "alone", "")
+    for case, pattern in (("alnum+", "[:alnum:]+"), ("graph{0,16}", "[[:alpha:][:digit:][:punct:]]{0,16}"))
+    for n in (8, 64)
+] + [
     ("`rateStrength(48, …)`, 16 characters", "pattern_bench", "rateStrength48/16", None, "", "alone", ""),
 ] + [
     (f"Hostile key press `{p.replace('|', chr(92) + '|')}`, 4092 chars: matching / not matching / required byte planted",

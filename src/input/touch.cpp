@@ -9,7 +9,7 @@
 #include <cstddef>
 #include <cstdint>
 
-#include "pattern/match.h"
+#include "pattern/pattern_engine.h"
 #include "session/session.h"
 
 namespace tessel {
@@ -42,7 +42,10 @@ std::uint32_t toggled(std::uint32_t v) noexcept { return v == 0 ? 1 : 0; }
 void appendKey(KeyboardSession& s, std::uint8_t ch) noexcept {
   const auto length = static_cast<std::int16_t>(s.content->length.load());
   if (length >= s.maxLength) return;
-  appendCharacter(*s.content, ch, s.accepts);
+  if (s.acceptsEngine != nullptr)
+    appendCharacter(*s.content, ch, *s.acceptsEngine);
+  else
+    appendCharacter(*s.content, ch, s.accepts);  // no pattern, or no memory to keep it compiled
 }
 
 // A character key of the full keyboard; `index` into the 26-key tables, or out of range when
@@ -196,18 +199,25 @@ int touch(KeyboardSession& session, int action, float x, float y) noexcept {
   return 1;
 }
 
-void appendCharacter(ContentStore& store, std::uint8_t ch, const char* pattern) noexcept {
+void appendCharacter(ContentStore& store, std::uint8_t ch, const PatternEngine& accepts) noexcept {
   if (store.length >= kContentCapacity) return;
   ContentGuard guard(store);
   std::uint8_t* text = guard.text();
   const std::size_t n = store.length;
   text[n] = ch;
   text[n + 1] = 0;
-  if (pattern != nullptr && wholeMatch(pattern, text, n + 1)) {
+  MatchContext context;
+  if (accepts.matches(text, n + 1, &context)) {
     store.length = static_cast<std::uint16_t>(n + 1);
   } else {
     text[n] = 0;
   }
+}
+
+void appendCharacter(ContentStore& store, std::uint8_t ch, const char* pattern) noexcept {
+  if (pattern == nullptr) return;
+  const PatternEngine accepts(pattern);
+  appendCharacter(store, ch, accepts);
 }
 
 void deleteLastCharacter(ContentStore& store) noexcept {

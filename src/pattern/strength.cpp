@@ -2,9 +2,9 @@
 //
 // The rule-set table is data: one rating per rule set 0..90. The general rating compares
 // the runs with the ceiling of half the length, the numeric-aware one with the floor: the two
-// thresholds differ on purpose. The default rating and the accepts check compile their
-// patterns per call (on this frame); the class predicates are the once-compiled ones of
-// password_measures.cpp.
+// thresholds differ on purpose. The default rating's two fixed patterns are compiled once per
+// process, like the class predicates of password_measures.cpp; the accepts check of
+// verification compiles the session's pattern per call (on this frame).
 #include "pattern/strength.h"
 
 #include <cstdlib>
@@ -164,9 +164,14 @@ char rateLettersRequired(const char* s) noexcept {
 }
 
 char rateDefault(const char* s) noexcept {
+  // Compiled on first use (thread-safe static initialisation); an engine is immutable and is
+  // matched from any thread with a context of the caller's own.
+  static const PatternEngine kWeak("([0-9]{0,})|(.{0,5})");
+  static const PatternEngine kMedium("([a-z]{6,})|([A-Z]{6,})");
   const Text t = textOf(s);
-  if (wholeMatchOf("([0-9]{0,})|(.{0,5})", t)) return 'W';
-  if (wholeMatchOf("([a-z]{6,})|([A-Z]{6,})", t)) return 'M';
+  MatchContext context;
+  if (kWeak.matches(t.bytes, t.n, &context)) return 'W';
+  if (kMedium.matches(t.bytes, t.n, &context)) return 'M';
   return 'S';
 }
 

@@ -11,6 +11,7 @@
 
 #include "crypto/wipe.h"
 #include "input/rand48.h"
+#include "pattern/pattern_engine.h"
 
 namespace tessel {
 
@@ -39,6 +40,7 @@ void freeSession(KeyboardSession* session) noexcept {
   releaseOwnedText(session->appPlat);
   releaseOwnedText(session->encryPlat);
   releaseOwnedText(session->accepts);
+  delete session->acceptsEngine;
   releaseOwnedText(session->sessionName);
   // eccKey, hashRandomSuffix and dictionaryFilter are not freed here: the release set of a
   // session is part of the library's documented behaviour (memory checkers name exactly these

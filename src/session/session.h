@@ -39,6 +39,8 @@ constexpr std::size_t kHighlightFlags = 9;
 // The 12-byte key of the in-memory seal.
 extern const std::uint8_t kSealKey[12];
 
+class PatternEngine;
+
 struct ContentStore {
   std::uint8_t scratch[kContentBufferSize] = {};
   std::uint8_t plaintext[kContentBufferSize] = {};  // sealed while idle and length != 0
@@ -59,6 +61,7 @@ struct KeyboardSession {
   char* sessionName = nullptr;
   RelaxedField<std::uint8_t> layoutBuilt;
   char* accepts = nullptr;
+  const PatternEngine* acceptsEngine = nullptr;     // accepts compiled once by setAccepts
   std::int16_t minLength = 0;
   std::int16_t maxLength = 0;                       // never above kContentCapacity
   RelaxedField<std::uint8_t> kbdRandom;

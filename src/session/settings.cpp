@@ -9,11 +9,13 @@
 
 #include <cstdlib>
 #include <cstring>
+#include <new>
 
 #include "crypto/codec.h"
 #include "crypto/der.h"
 #include "crypto/secure_buffer.h"
 #include "crypto/wipe.h"
+#include "pattern/pattern_engine.h"
 #include "session/session.h"
 
 namespace tessel {
@@ -61,7 +63,13 @@ std::uint16_t binaryModeOrZero(std::int16_t m) noexcept {
 
 }  // namespace
 
-void setAccepts(KeyboardSession& s, const char* pattern) noexcept { replaceOwnedText(s.accepts, pattern); }
+// The key press matches the pattern against the whole text each time: it is compiled here, once
+// per setting, not per key. Without memory for it, key presses compile it themselves.
+void setAccepts(KeyboardSession& s, const char* pattern) noexcept {
+  replaceOwnedText(s.accepts, pattern);
+  delete s.acceptsEngine;
+  s.acceptsEngine = s.accepts != nullptr ? new (std::nothrow) PatternEngine(s.accepts) : nullptr;
+}
 
 void setMinLength(KeyboardSession& s, std::int16_t n) noexcept {
   if (n >= 0) s.minLength = n;
