@@ -30,6 +30,53 @@ namespace {
 float padAspectX(bool mode1) { return render::floatFromBits(mode1 ? 0x3F2AAAABu : 0x3E666667u); }  // 2/3, 0.225
 float padSwitchLabelX(bool mode1) { return render::floatFromBits(mode1 ? 0x3FAAAAABu : 0x3EE66667u); }  // 4/3, 0.45
 
+// One link of a placement chain, after the keyboard's start (letter or pad grid). The aspect
+// links depend on the frame: kAspect is render::aspect; kLabel the wide factors of the switch
+// and done labels; kPad S(padAspectX, y); kIcon the icon correction, S(1 / keyAspect, 1) T(x, 0)
+// in surface mode 1, S(1, keyAspect) T(y, 0) otherwise.
+struct Step {
+  enum Kind : std::uint8_t { kT, kS, kAspect, kLabel, kPad, kIcon } kind;
+  float x, y;
+};
+
+constexpr Step kAspectStep{Step::kAspect, 0.0f, 0.0f};
+constexpr Step kLabelStep{Step::kLabel, 0.0f, 0.0f};
+
+// Letter keyboard, function keys: faces, then icons and labels (shift, delete, switch, done).
+constexpr Step kShiftFace[] = {{Step::kT, -8.5f, -1.0f}, {Step::kS, 1.5f, 1.0f}, {Step::kS, 0.753f, 0.884f},
+                               {Step::kT, -0.185f, 0.0f}};
+constexpr Step kDeleteFace[] = {{Step::kT, 8.5f, -1.0f}, {Step::kS, 1.5f, 1.0f}, {Step::kS, 0.753f, 0.884f},
+                                {Step::kT, 0.185f, 0.0f}};
+constexpr Step kSwitchFace[] = {{Step::kT, -7.5f, -3.0f}, {Step::kS, 2.5f, 1.0f}, {Step::kS, 0.9f, 0.9f}};
+constexpr Step kDoneFace[] = {{Step::kT, 7.5f, -3.0f}, {Step::kS, 2.5f, 1.0f}, {Step::kS, 0.926f, 0.884f}};
+constexpr Step kShiftIcon[] = {{Step::kT, -8.5f, -1.0f}, {Step::kIcon, -0.1f, -0.2f}, {Step::kS, 0.4f, 0.4f}};
+constexpr Step kDeleteIcon[] = {{Step::kT, 8.5f, -1.0f}, {Step::kIcon, 0.1f, 0.2f}, {Step::kS, 0.48f, 0.48f}};
+constexpr Step kSwitchLabel[] = {{Step::kT, -7.5f, -3.0f}, kLabelStep, {Step::kS, 0.64f, 0.64f}};
+constexpr Step kDoneLabel[] = {{Step::kT, 7.5f, -3.0f}, kLabelStep, {Step::kS, 0.36f, 0.36f}};
+// Letter keyboard, after T(key centre): a key face, a glyph.
+constexpr Step kCharFace[] = {{Step::kS, 0.815f, 0.884f}};
+constexpr Step kGlyph[] = {kAspectStep, {Step::kS, 0.3f, 0.3f}};
+constexpr Step kSpaceFace[] = {{Step::kT, 0.0f, -3.0f}, {Step::kS, 5.0f, 1.0f}, {Step::kS, 0.963f, 0.884f}};
+// The balloon over the held key, after T(x, one row up) and T(x, two rows up).
+constexpr Step kBalloon[] = {kAspectStep, {Step::kT, 0.0f, 0.04f}, {Step::kS, 1.05f, 1.054f},
+                             {Step::kS, 0.895f, 0.884f}, {Step::kS, 1.5f, 1.5f}};
+constexpr Step kBalloonGlyph[] = {kAspectStep, {Step::kT, 0.0f, -0.05f}, {Step::kS, 1.05f, 1.054f},
+                                  {Step::kS, 0.895f, 0.884f}, {Step::kS, 0.65f, 0.65f}};
+
+// Number pad, after T(cell centre): a key face, the merged bottom key (type 2), a digit.
+constexpr Step kPadFace[] = {{Step::kS, 0.96065f, 0.93617f}};
+constexpr Step kPadMergedFace[] = {{Step::kS, 1.96065f, 0.93617f}};
+constexpr Step kPadDigit[] = {{Step::kPad, 0.0f, 2.0f}, {Step::kS, 0.44f, 0.44f}};
+// Number pad, function keys and labels (type 1 adds the two bottom labels and the done icon).
+constexpr Step kPadDoneFace[] = {{Step::kT, 3.0f, -2.0f}, {Step::kS, 1.0f, 2.0f}, {Step::kS, 0.96065f, 0.96809f}};
+constexpr Step kPadLabelLeft[] = {{Step::kT, -1.0f, -3.0f}, {Step::kPad, 0.0f, 2.0f}, {Step::kS, 0.4f, 0.4f}};
+constexpr Step kPadLabelRight[] = {{Step::kT, 1.0f, -3.0f}, {Step::kPad, 0.0f, 0.5f}, {Step::kS, 0.72f, 0.72f}};
+constexpr Step kPadDeleteLabel[] = {{Step::kT, 3.0f, 3.0f}, {Step::kPad, 0.0f, 1.0f}, {Step::kS, 0.6f, 0.6f}};
+constexpr Step kPadSwitchLabel[] = {{Step::kT, 3.0f, 1.0f}, {Step::kPad, 0.0f, 0.5f}, {Step::kS, 0.72f, 0.72f}};
+constexpr Step kPadDoneLabel[] = {{Step::kT, 3.0f, -2.0f}, {Step::kPad, 0.0f, 0.5f}, {Step::kS, 0.72f, 0.72f}};
+constexpr Step kPadDoneIcon[] = {{Step::kT, 3.0f, -3.0f}, {Step::kPad, 0.0f, 1.0f}, {Step::kT, 0.0f, -0.3f},
+                                 {Step::kS, 0.4f, 0.4f}};
+
 struct Frame {
   const KeyboardSession& s;
   const MainTextureSet& t;
@@ -41,18 +88,63 @@ struct Frame {
     S(0.953125f, 0.92611f);
     S(2.5f * columnFraction, rowFraction);
   }
-  void aspect() const { render::aspect(mode1, keyAspect); }
-  void padAspect(float y) const { S(padAspectX(mode1), y); }
-  // Switch and done labels: wide aspect factors.
-  void labelAspect() const {
-    if (mode1)
-      S(2.0f / keyAspect, 1.0f);
-    else
-      S(2.0f, keyAspect);
+
+  void apply(const Step& step) const {
+    switch (step.kind) {
+      case Step::kT: T(step.x, step.y); break;
+      case Step::kS: S(step.x, step.y); break;
+      case Step::kAspect: render::aspect(mode1, keyAspect); break;
+      case Step::kLabel:
+        if (mode1)
+          S(2.0f / keyAspect, 1.0f);
+        else
+          S(2.0f, keyAspect);
+        break;
+      case Step::kPad: S(padAspectX(mode1), step.y); break;
+      case Step::kIcon:
+        if (mode1) {
+          S(1.0f / keyAspect, 1.0f);
+          T(step.x, 0.0f);
+        } else {
+          S(1.0f, keyAspect);
+          T(step.y, 0.0f);
+        }
+        break;
+    }
+  }
+  template <std::size_t N>
+  void chain(const Step (&steps)[N]) const {
+    for (const Step& step : steps) apply(step);
+  }
+
+  // A quad on the letter grid: start, an optional translation, the chain, the texture.
+  template <std::size_t N>
+  void letter(const Step (&steps)[N], const TextureName& texture, const GLfloat* set) const {
+    letterStart();
+    chain(steps);
+    render::drawQuad(texture.load(), set);
+  }
+  template <std::size_t N>
+  void letterAt(float x, float y, const Step (&steps)[N], const TextureName& texture, const GLfloat* set) const {
+    letterStart();
+    T(x, y);
+    chain(steps);
+    render::drawQuad(texture.load(), set);
+  }
+  template <std::size_t N>
+  void pad(const Step (&steps)[N], const TextureName& texture) const {
+    padStart();
+    chain(steps);
+    render::drawQuad(texture.load(), render::kFullSet);
+  }
+  template <std::size_t N>
+  void padAt(float x, float y, const Step (&steps)[N], const TextureName& texture) const {
+    padStart();
+    T(x, y);
+    chain(steps);
+    render::drawQuad(texture.load(), render::kFullSet);
   }
 };
-
-GLuint name(const TextureName& n) { return n.load(); }
 
 // Centre of layout position i (0..25) on the letter keyboard.
 void keyCentre(int i, float& x, float& y) {
@@ -81,78 +173,30 @@ void drawLetterKeyboard(const Frame& f) {
   std::uint32_t released[kHighlightFlags];
   for (std::size_t k = 0; k < kHighlightFlags; ++k) released[k] = s.keyReleased[k];
   const bool symbols = s.symbolPage != 0;
+  auto face = [&](const TextureName (&pair)[2], std::size_t flag) -> const TextureName& {
+    return pair[released[flag] == 1 ? 0 : 1];
+  };
 
-  // 1. Function key faces.
+  // 1. Function key faces; 2. their icons and labels.
   render::beginBlend();
-  f.letterStart();
-  T(-8.5f, -1.0f);
-  S(1.5f, 1.0f);
-  S(0.753f, 0.884f);
-  T(-0.185f, 0.0f);
-  render::drawQuad(name(t.shiftDeleteKeyTextures[released[4] == 1 ? 0 : 1]), render::kShiftSet);
-  f.letterStart();
-  T(8.5f, -1.0f);
-  S(1.5f, 1.0f);
-  S(0.753f, 0.884f);
-  T(0.185f, 0.0f);
-  render::drawQuad(name(t.shiftDeleteKeyTextures[released[5] == 1 ? 0 : 1]), render::kShiftSet);
-  f.letterStart();
-  T(-7.5f, -3.0f);
-  S(2.5f, 1.0f);
-  S(0.9f, 0.9f);
-  render::drawQuad(name(t.switchKeyTextures[released[0] == 1 ? 0 : 1]), render::kBarSet);
-  f.letterStart();
-  T(7.5f, -3.0f);
-  S(2.5f, 1.0f);
-  S(0.926f, 0.884f);
-  render::drawQuad(name(t.doneKeyTextures[released[2] == 1 ? 0 : 1]), render::kBarSet);
+  f.letter(kShiftFace, face(t.shiftDeleteKeyTextures, 4), render::kShiftSet);
+  f.letter(kDeleteFace, face(t.shiftDeleteKeyTextures, 5), render::kShiftSet);
+  f.letter(kSwitchFace, face(t.switchKeyTextures, 0), render::kBarSet);
+  f.letter(kDoneFace, face(t.doneKeyTextures, 2), render::kBarSet);
   render::endBlend();
-
-  // 2. Function key icons and labels.
   render::beginBlend();
-  f.letterStart();
-  T(-8.5f, -1.0f);
-  if (f.mode1) {
-    S(1.0f / f.keyAspect, 1.0f);
-    T(-0.1f, 0.0f);
-  } else {
-    S(1.0f, f.keyAspect);
-    T(-0.2f, 0.0f);
-  }
-  S(0.4f, 0.4f);
-  render::drawQuad(name(t.iconTextures[symbols ? 3 : (s.shiftOn != 0 ? 2 : 1)]), render::kFullSet);
-  f.letterStart();
-  T(8.5f, -1.0f);
-  if (f.mode1) {
-    S(1.0f / f.keyAspect, 1.0f);
-    T(0.1f, 0.0f);
-  } else {
-    S(1.0f, f.keyAspect);
-    T(0.2f, 0.0f);
-  }
-  S(0.48f, 0.48f);
-  render::drawQuad(name(t.iconTextures[0]), render::kFullSet);
-  f.letterStart();
-  T(-7.5f, -3.0f);
-  f.labelAspect();
-  S(0.64f, 0.64f);
-  render::drawQuad(name(t.labelTextures[s.switchMode == 1 ? 4 : (symbols ? 0 : 1)]), render::kFullSet);
-  f.letterStart();
-  T(7.5f, -3.0f);
-  f.labelAspect();
-  S(0.36f, 0.36f);
-  render::drawQuad(name(t.labelTextures[released[2] == 1 ? 2 : 3]), render::kFullSet);
+  f.letter(kShiftIcon, t.iconTextures[symbols ? 3 : (s.shiftOn != 0 ? 2 : 1)], render::kFullSet);
+  f.letter(kDeleteIcon, t.iconTextures[0], render::kFullSet);
+  f.letter(kSwitchLabel, t.labelTextures[s.switchMode == 1 ? 4 : (symbols ? 0 : 1)], render::kFullSet);
+  f.letter(kDoneLabel, t.labelTextures[released[2] == 1 ? 2 : 3], render::kFullSet);
   render::endBlend();
 
   // 3. Character key faces.
+  float x, y;
   render::beginBlend();
   for (int i = 0; i < static_cast<int>(kKeyCount); ++i) {
-    float x, y;
     keyCentre(i, x, y);
-    f.letterStart();
-    T(x, y);
-    S(0.815f, 0.884f);
-    render::drawQuad(name(t.charKeyTextures[0]), render::kSquareSet);
+    f.letterAt(x, y, kCharFace, t.charKeyTextures[0], render::kSquareSet);
   }
   render::endBlend();
 
@@ -160,15 +204,13 @@ void drawLetterKeyboard(const Frame& f) {
   const std::uint32_t row = s.touchRow, column = s.touchColumn;
   const bool heldShown = s.anyKeyReleased == 0 && released[3] != 1 && s.kbdMode == 0 && row <= 2;
   const float heldX = 2.0f * static_cast<float>(column) - (row == 0 ? 9.0f : 8.0f);
+  const float rowY = 2.0f * static_cast<float>(row);
   const std::uint32_t heldGlyph = column + (row == 0 ? 0 : row == 1 ? 10 : 18);  // unsigned: wraps high
 
   // 4. Held key face.
   if (heldShown) {
     render::beginBlend();
-    f.letterStart();
-    T(heldX, 3.0f - 2.0f * static_cast<float>(row));
-    S(0.815f, 0.884f);
-    render::drawQuad(name(t.charKeyTextures[1]), render::kSquareSet);
+    f.letterAt(heldX, 3.0f - rowY, kCharFace, t.charKeyTextures[1], render::kSquareSet);
     render::endBlend();
   }
 
@@ -176,26 +218,17 @@ void drawLetterKeyboard(const Frame& f) {
   const TextureName* glyphs = currentGlyphs(s, t);
   render::beginBlend();
   for (int i = 0; i < static_cast<int>(kKeyCount); ++i) {
-    float x, y;
     keyCentre(i, x, y);
-    f.letterStart();
-    T(x, y);
-    f.aspect();
-    S(0.3f, 0.3f);
-    render::drawQuad(name(glyphs[i]), render::kFullSet);
+    f.letterAt(x, y, kGlyph, glyphs[i], render::kFullSet);
   }
   render::endBlend();
 
   // 6. Space key face.
   render::beginBlend();
-  f.letterStart();
-  T(0.0f, -3.0f);
-  S(5.0f, 1.0f);
-  S(0.963f, 0.884f);
-  render::drawQuad(name(t.spaceKeyTextures[released[1] == 1 ? 0 : 1]), render::kWideSet);
+  f.letter(kSpaceFace, face(t.spaceKeyTextures, 1), render::kWideSet);
   render::endBlend();
 
-  // 7. Space label.
+  // 7. Space label, scaled to the key's own aspect.
   const float r = s.keyWidth / s.keyHeight;
   render::beginBlend();
   f.letterStart();
@@ -207,31 +240,14 @@ void drawLetterKeyboard(const Frame& f) {
     S(0.6f / r, 1.0f);
     S(1.2f, 1.2f);
   }
-  render::drawQuad(name(t.spaceLabelTexture), render::kWideSet);
+  render::drawQuad(t.spaceLabelTexture.load(), render::kWideSet);
   render::endBlend();
 
   // 8. Key balloon over the held key, with its glyph enlarged one key height higher.
   if (heldShown && s.surfaceMode != 0 && s.popMode != 0) {
-    const float rowY = 2.0f * static_cast<float>(row);
     render::beginBlend();
-    f.letterStart();
-    T(heldX, 4.0f - rowY);
-    f.aspect();
-    T(0.0f, 0.04f);
-    S(1.05f, 1.054f);
-    S(0.895f, 0.884f);
-    S(1.5f, 1.5f);
-    render::drawQuad(name(t.charKeyTextures[2]), render::kFullSet);
-    if (heldGlyph < kKeyCount) {
-      f.letterStart();
-      T(heldX, 5.0f - rowY);
-      f.aspect();
-      T(0.0f, -0.05f);
-      S(1.05f, 1.054f);
-      S(0.895f, 0.884f);
-      S(0.65f, 0.65f);
-      render::drawQuad(name(glyphs[heldGlyph]), render::kFullSet);
-    }
+    f.letterAt(heldX, 4.0f - rowY, kBalloon, t.charKeyTextures[2], render::kFullSet);
+    if (heldGlyph < kKeyCount) f.letterAt(heldX, 5.0f - rowY, kBalloonGlyph, glyphs[heldGlyph], render::kFullSet);
     render::endBlend();
   }
 }
@@ -244,6 +260,8 @@ void drawNumberPad(const Frame& f) {
   const std::uint32_t releasedKey = s.keyReleased[3], releasedDone = s.keyReleased[2];
   const bool highlight = s.kbdMode == 0 && releasedKey != 1;
   auto held = [&](std::uint32_t c, std::uint32_t r) { return highlight && column == c && row == r; };
+  auto cellX = [](int c) { return static_cast<float>(2 * c - 3); };
+  auto cellY = [](int r) { return static_cast<float>(3 - 2 * r); };
 
   // 1. Key faces. Digit cells use face 0 at rest and 1 when held; the two function keys above
   // the done key the other way round.
@@ -251,67 +269,33 @@ void drawNumberPad(const Frame& f) {
   for (int n = 0; n < 12; ++n) {
     const int c = n % 3, r = n / 3;
     if (type == 2 && n == 11) continue;  // merged into position 10
-    const bool merged = type == 2 && n == 10;
-    f.padStart();
-    T(merged ? 0.0f : static_cast<float>(2 * c - 3), static_cast<float>(3 - 2 * r));
-    S(merged ? 1.96065f : 0.96065f, 0.93617f);
-    render::drawQuad(name(t.padKeyTextures[held(merged ? 1 : c, r) ? 1 : 0]), render::kFullSet);
+    if (type == 2 && n == 10)
+      f.padAt(0.0f, cellY(r), kPadMergedFace, t.padKeyTextures[held(1, r) ? 1 : 0]);
+    else
+      f.padAt(cellX(c), cellY(r), kPadFace, t.padKeyTextures[held(c, r) ? 1 : 0]);
   }
-  for (int r = 0; r < 2; ++r) {
-    f.padStart();
-    T(3.0f, static_cast<float>(3 - 2 * r));
-    S(0.96065f, 0.93617f);
-    render::drawQuad(name(t.padKeyTextures[held(3, r) ? 0 : 1]), render::kFullSet);
-  }
-  f.padStart();
-  T(3.0f, -2.0f);
-  S(1.0f, 2.0f);
-  S(0.96065f, 0.96809f);
-  render::drawQuad(name(t.padDoneKeyTextures[(s.kbdMode != 0 || releasedDone == 1) ? 0 : 1]), render::kFullSet);
+  for (int r = 0; r < 2; ++r) f.padAt(3.0f, cellY(r), kPadFace, t.padKeyTextures[held(3, r) ? 0 : 1]);
+  f.pad(kPadDoneFace, t.padDoneKeyTextures[(s.kbdMode != 0 || releasedDone == 1) ? 0 : 1]);
   render::endBlend();
 
   // 2. Glyphs and labels.
   render::beginBlend();
-  for (int n = 0; n < 10; ++n) {
-    f.padStart();
-    T(static_cast<float>(2 * (n % 3) - 3), static_cast<float>(3 - 2 * (n / 3)));
-    f.padAspect(2.0f);
-    S(0.44f, 0.44f);
-    render::drawQuad(name(t.padDigitTextures[n]), render::kFullSet);
-  }
+  for (int n = 0; n < 10; ++n) f.padAt(cellX(n % 3), cellY(n / 3), kPadDigit, t.padDigitTextures[n]);
   if (type == 1) {
-    f.padStart();
-    T(-1.0f, -3.0f);
-    f.padAspect(2.0f);
-    S(0.4f, 0.4f);
-    render::drawQuad(name(t.padLabelTextures[2]), render::kFullSet);
-    f.padStart();
-    T(1.0f, -3.0f);
-    f.padAspect(0.5f);
-    S(0.72f, 0.72f);
-    render::drawQuad(name(t.padLabelTextures[1]), render::kFullSet);
+    f.pad(kPadLabelLeft, t.padLabelTextures[2]);
+    f.pad(kPadLabelRight, t.padLabelTextures[1]);
   }
-  f.padStart();
-  T(3.0f, 3.0f);
-  f.padAspect(1.0f);
-  S(0.6f, 0.6f);
-  render::drawQuad(name(t.padLabelTextures[3]), render::kFullSet);
-  f.padStart();
-  T(3.0f, 1.0f);
+  f.pad(kPadDeleteLabel, t.padLabelTextures[3]);
   if (s.switchMode == 1) {
+    f.padStart();
+    T(3.0f, 1.0f);
     S(padSwitchLabelX(f.mode1), 1.0f);
     S(0.64f, 0.64f);
-    render::drawQuad(name(t.labelTextures[0]), render::kFullSet);
+    render::drawQuad(t.labelTextures[0].load(), render::kFullSet);
   } else {
-    f.padAspect(0.5f);
-    S(0.72f, 0.72f);
-    render::drawQuad(name(t.padLabelTextures[0]), render::kFullSet);
+    f.pad(kPadSwitchLabel, t.padLabelTextures[0]);
   }
-  f.padStart();
-  T(3.0f, -2.0f);
-  f.padAspect(0.5f);
-  S(0.72f, 0.72f);
-  render::drawQuad(name(t.labelTextures[releasedDone != 0 ? 2 : 3]), render::kFullSet);
+  f.pad(kPadDoneLabel, t.labelTextures[releasedDone != 0 ? 2 : 3]);
   render::endBlend();
 
   // 3. The merged bottom key's label (type 2) or the done key's icon (type 1).
@@ -325,16 +309,11 @@ void drawNumberPad(const Frame& f) {
       S(0.6f / r, 1.0f);
     else
       S(1.0f, r / 0.6f);
-    render::drawQuad(name(t.spaceLabelTexture), render::kWideSet);
+    render::drawQuad(t.spaceLabelTexture.load(), render::kWideSet);
     render::endBlend();
   } else if (type == 1) {
     render::beginBlend();
-    f.padStart();
-    T(3.0f, -3.0f);
-    f.padAspect(1.0f);
-    T(0.0f, -0.3f);
-    S(0.4f, 0.4f);
-    render::drawQuad(name(t.padDoneIconTexture), render::kFullSet);
+    f.pad(kPadDoneIcon, t.padDoneIconTexture);
     render::endBlend();
   }
 }
@@ -357,7 +336,7 @@ void mainSurfaceChanged(KeyboardSession& s, int width, int height, int variant) 
 void mainDrawFrame(const KeyboardSession& s) {
   const MainTextureSet& t = s.mainTextures;
   render::clearFrame();
-  render::drawBackground(name(t.backgroundTexture));
+  render::drawBackground(t.backgroundTexture.load());
   const Frame f{s, t, s.surfaceMode == 1, s.columnFraction, s.rowFraction, s.keyAspect};
   if (s.currentKbdType == 0)
     drawLetterKeyboard(f);
