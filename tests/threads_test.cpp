@@ -23,13 +23,15 @@
 #include "com_qn_tessel_plugin_QNKbdJniLib.h"
 #include "server/envelope.h"
 #include "session/session.h"
-#include "support/egl_context.h"
+#include "common/egl_pbuffer.h"
 #include "support/openssl_oracle.h"
 
 #define JNI(method) Java_com_qn_tessel_plugin_QNKbdJniLib_##method
 
 namespace tessel::test {
 namespace {
+
+using host::GlesContext;
 
 // ---- a JNIEnv with only what the entry points call: strings and byte arrays as plain objects
 
