@@ -104,7 +104,6 @@ bool takeBytes(jbyteArray a) {
 // ---- the app's side
 
 constexpr int kWidth = 320, kHeight = 200;  // keys 32 x 50 pixels
-constexpr int kSlots = 20;
 
 int openKeyboard(const std::string& name) {
   const int h = JNI(createNativeSession)(env(), nullptr, Arg(name));
@@ -154,7 +153,7 @@ std::optional<std::string> everyGetter(int h) {
 }
 
 void destroyAll() {
-  for (int h = 0; h < kSlots; ++h) JNI(destroyNativeSession)(env(), nullptr, h);
+  for (int h = 0; h < kSessionSlots; ++h) JNI(destroyNativeSession)(env(), nullptr, h);
 }
 
 // A GL thread: draws the three surfaces of whatever handle `target` holds, re-creating them now
