@@ -1,12 +1,11 @@
 // Input buffering and final padding shared by the 64-byte-block digests (MD5, SHA-1), whose
 // contexts both count the message length in bytes.
 //
-// absorbBlocks completes a partly filled block from the input, compresses whole blocks straight
-// from the input without copying them, and keeps the tail in the context's block buffer.
-// `used` is how many bytes the buffer already holds (0..63); compress(blocks, count) runs the
-// digest's compression over `count` consecutive 64-byte blocks. padFinalBlock ends the message.
-// absorbInSlices feeds an input of any size to an update function that takes 32-bit lengths
-// (the one-shot digests).
+// absorb adds input to a context: it completes a partly filled block from the input, compresses
+// whole blocks straight from the input without copying them, and keeps the tail in the context's
+// block buffer. `length` is the context's byte count, whose low six bits say how many bytes the
+// buffer holds; compress(blocks, count) runs the digest's compression over `count` consecutive
+// 64-byte blocks. padFinalBlock ends the message.
 #pragma once
 
 #include <cstddef>
@@ -16,8 +15,12 @@
 namespace tessel {
 
 template <typename Compress>
-inline void absorbBlocks(std::uint8_t block[64], std::size_t used, const std::uint8_t* p,
-                         std::size_t left, Compress compress) noexcept {
+inline void absorb(std::uint8_t block[64], std::uint64_t& length, const void* data, std::size_t left,
+                   Compress compress) noexcept {
+  if (left == 0) return;
+  const std::uint8_t* p = static_cast<const std::uint8_t*>(data);
+  std::size_t used = length & 63;
+  length += left;
   if (used != 0) {
     const std::size_t take = left < 64 - used ? left : 64 - used;
     std::memcpy(block + used, p, take);
@@ -56,17 +59,6 @@ inline void padFinalBlock(std::uint8_t block[64], std::uint64_t bytes, LengthOrd
   for (int i = 0; i < 8; ++i)
     block[56 + i] = static_cast<std::uint8_t>(bits >> (order == LengthOrder::kBigEndian ? 56 - 8 * i : 8 * i));
   compress(block, 1);
-}
-
-template <typename Update>
-inline void absorbInSlices(const void* data, std::size_t length, Update update) noexcept {
-  const std::uint8_t* p = static_cast<const std::uint8_t*>(data);
-  while (length > 0) {
-    const std::uint32_t n = length > 0x40000000u ? 0x40000000u : static_cast<std::uint32_t>(length);
-    update(p, n);
-    p += n;
-    length -= n;
-  }
 }
 
 }  // namespace tessel

@@ -118,6 +118,11 @@ void compress(std::uint32_t state[4], const std::uint8_t* block, std::size_t blo
   secureWipe(x, sizeof(x));
 }
 
+// The compression over a context's state, as block_buffer.h calls it.
+auto compressInto(Md5Context& ctx) noexcept {
+  return [&ctx](const std::uint8_t* blocks, std::size_t count) { compress(ctx.state, blocks, count); };
+}
+
 }  // namespace
 
 void md5Init(Md5Context& ctx) noexcept {
@@ -130,24 +135,18 @@ void md5Init(Md5Context& ctx) noexcept {
 }
 
 void md5Update(Md5Context& ctx, const void* data, std::uint32_t length) noexcept {
-  if (length == 0) return;
-  const std::uint8_t* p = static_cast<const std::uint8_t*>(data);
-  const std::size_t used = ctx.length & 63;
-  ctx.length += length;
-  absorbBlocks(ctx.block, used, p, length,
-               [&ctx](const std::uint8_t* blocks, std::size_t count) { compress(ctx.state, blocks, count); });
+  absorb(ctx.block, ctx.length, data, length, compressInto(ctx));
 }
 
 void md5Final(Md5Context& ctx, std::uint8_t digest[16]) noexcept {
-  padFinalBlock(ctx.block, ctx.length, LengthOrder::kLittleEndian,
-                [&ctx](const std::uint8_t* blocks, std::size_t count) { compress(ctx.state, blocks, count); });
+  padFinalBlock(ctx.block, ctx.length, LengthOrder::kLittleEndian, compressInto(ctx));
   for (int i = 0; i < 4; ++i) store32le(digest + 4 * i, ctx.state[i]);
 }
 
 void md5(const void* data, std::size_t length, std::uint8_t digest[16]) noexcept {
   Md5Context ctx;
   md5Init(ctx);
-  absorbInSlices(data, length, [&ctx](const std::uint8_t* p, std::uint32_t n) { md5Update(ctx, p, n); });
+  absorb(ctx.block, ctx.length, data, length, compressInto(ctx));
   md5Final(ctx, digest);
   wipeObject(ctx);
 }

@@ -155,6 +155,11 @@ void compress(std::uint32_t state[5], const std::uint8_t* block, std::size_t blo
   compressPortable(state, block, blocks);
 }
 
+// The compression over a context's state, as block_buffer.h calls it.
+auto compressInto(Sha1Context& ctx) noexcept {
+  return [&ctx](const std::uint8_t* blocks, std::size_t count) { compress(ctx.state, blocks, count); };
+}
+
 }  // namespace
 
 void sha1Init(Sha1Context& ctx) noexcept {
@@ -168,24 +173,18 @@ void sha1Init(Sha1Context& ctx) noexcept {
 }
 
 void sha1Update(Sha1Context& ctx, const void* data, std::uint32_t length) noexcept {
-  if (length == 0) return;
-  const std::uint8_t* p = static_cast<const std::uint8_t*>(data);
-  const std::size_t used = ctx.length & 63;
-  ctx.length += length;
-  absorbBlocks(ctx.block, used, p, length,
-               [&ctx](const std::uint8_t* blocks, std::size_t count) { compress(ctx.state, blocks, count); });
+  absorb(ctx.block, ctx.length, data, length, compressInto(ctx));
 }
 
 void sha1Final(Sha1Context& ctx, std::uint8_t digest[20]) noexcept {
-  padFinalBlock(ctx.block, ctx.length, LengthOrder::kBigEndian,
-                [&ctx](const std::uint8_t* blocks, std::size_t count) { compress(ctx.state, blocks, count); });
+  padFinalBlock(ctx.block, ctx.length, LengthOrder::kBigEndian, compressInto(ctx));
   for (int i = 0; i < 5; ++i) store32be(digest + 4 * i, ctx.state[i]);
 }
 
 void sha1(const void* data, std::size_t length, std::uint8_t digest[20]) noexcept {
   Sha1Context ctx;
   sha1Init(ctx);
-  absorbInSlices(data, length, [&ctx](const std::uint8_t* p, std::uint32_t n) { sha1Update(ctx, p, n); });
+  absorb(ctx.block, ctx.length, data, length, compressInto(ctx));
   sha1Final(ctx, digest);
   wipeObject(ctx);
 }
