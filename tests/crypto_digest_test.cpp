@@ -58,7 +58,10 @@ void checkAgainstOpenSsl() {
 
 class Sha1Compression : public ::testing::TestWithParam<bool> {
  protected:
-  void SetUp() override { cpuAllowFeature(CpuFeature::kShaNi, GetParam()); }
+  void SetUp() override {
+    cpuAllowFeature(CpuFeature::kShaNi, GetParam());
+    ASSERT_TRUE(GetParam() || !cpuFeatureUsable(CpuFeature::kShaNi)) << "the portable run must be portable";
+  }
   void TearDown() override { cpuAllowFeature(CpuFeature::kShaNi, true); }
 };
 
