@@ -67,20 +67,13 @@ struct BorderCase {
 };
 
 const BorderCase kBorderCases[] = {
-    {"row1LeftDeadZone", 3.0f, 15.0f, 0, "", 0, 0},
-    {"row1FirstKey", std::nextafter(3.0f, 4.0f), 15.0f, 0, "a", 0, 0},
-    {"row1RightDeadZone", 93.0f, 15.0f, 0, "", 0, 0},
-    {"row1LastKey", std::nextafter(93.0f, 0.0f), 15.0f, 0, "l", 0, 0},
-    {"row1KeyBorder", 13.0f, 15.0f, 0, "s", 0, 0},
-    {"row0KeyBorder", 10.0f, 5.0f, 0, "w", 0, 0},
-    {"row1TopBorder", 50.0f, 10.0f, 0, "g", 0, 0},
-    {"shiftBelow15", std::nextafter(15.0f, 0.0f), 25.0f, 0, "", 1, 0},
-    {"firstRow2KeyAt15", 15.0f, 25.0f, 0, "z", 0, 0},
-    {"lastRow2Key", std::nextafter(85.0f, 0.0f), 25.0f, 0, "m", 0, 0},
-    {"row2At85HoldsNoKey", 85.0f, 25.0f, 0, "", 0, 0},
-    {"spaceAt25", 25.0f, 35.0f, 0, " ", 0, 0},
-    {"switchBelow25", std::nextafter(25.0f, 0.0f), 35.0f, 0, "", 0, 1},
-    {"doneAt75", 75.0f, 35.0f, 1, "", 0, 0},
+    {"row1LeftDeadZone", 3.0f, 15.0f, 0, "", 0, 0},        {"row1FirstKey", std::nextafter(3.0f, 4.0f), 15.0f, 0, "a", 0, 0},
+    {"row1RightDeadZone", 93.0f, 15.0f, 0, "", 0, 0},      {"row1LastKey", std::nextafter(93.0f, 0.0f), 15.0f, 0, "l", 0, 0},
+    {"row1KeyBorder", 13.0f, 15.0f, 0, "s", 0, 0},         {"row0KeyBorder", 10.0f, 5.0f, 0, "w", 0, 0},
+    {"row1TopBorder", 50.0f, 10.0f, 0, "g", 0, 0},         {"shiftBelow15", std::nextafter(15.0f, 0.0f), 25.0f, 0, "", 1, 0},
+    {"firstRow2KeyAt15", 15.0f, 25.0f, 0, "z", 0, 0},      {"lastRow2Key", std::nextafter(85.0f, 0.0f), 25.0f, 0, "m", 0, 0},
+    {"row2At85HoldsNoKey", 85.0f, 25.0f, 0, "", 0, 0},     {"spaceAt25", 25.0f, 35.0f, 0, " ", 0, 0},
+    {"switchBelow25", std::nextafter(25.0f, 0.0f), 35.0f, 0, "", 0, 1}, {"doneAt75", 75.0f, 35.0f, 1, "", 0, 0},
     {"spaceBelow75", std::nextafter(75.0f, 0.0f), 35.0f, 0, " ", 0, 0},
 };
 
