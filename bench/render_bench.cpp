@@ -27,7 +27,7 @@
 
 #include "render/surfaces.h"
 #include "session/session.h"
-#include "support/egl_context.h"
+#include "common/egl_pbuffer.h"
 
 namespace {
 
@@ -121,7 +121,7 @@ struct Scene {
     s->touchColumn = scene == 0 ? 3 : 1;
   }
   ~Scene() { tessel::destroySession(handle); }
-  tessel::test::GlesContext gl;
+  tessel::host::GlesContext gl;
   int handle = -1;
   KeyboardSession* s = nullptr;
 };
@@ -201,7 +201,7 @@ void BM_StartUp(benchmark::State& state) {
   for (auto _ : state) {
     state.PauseTiming();
     {
-      tessel::test::GlesContext gl(kind.width, kind.height);
+      tessel::host::GlesContext gl(kind.width, kind.height);
       if (s == nullptr || !gl.ok()) {
         state.SkipWithError(("no offscreen GLES 1.1: " + gl.error()).c_str());
         break;

@@ -11,6 +11,7 @@
 #include <vector>
 
 #include "crypto/bignum.h"
+#include "crypto/cpu_features.h"
 #include "support/openssl_oracle.h"
 
 namespace tessel {
@@ -106,9 +107,10 @@ TEST(BigNumberModExp, EveryKernelPreparedOrNotAndEvenModuli) {
     const std::string expected = test::opensslBnModExp(base, exp, mod);
     BigNumber r[4];
     ASSERT_TRUE(bnModExp(num(base), num(exp), num(mod), r[0]));
-    bnAllowAssemblyKernel(false);  // the C rows, where the assembly kernel would be used
+    cpuAllowFeature(CpuFeature::kBmi2Adx, false);  // the C rows, where the assembly kernel would be used
+    ASSERT_FALSE(cpuFeatureUsable(CpuFeature::kBmi2Adx));
     ASSERT_TRUE(bnModExp(num(base), num(exp), num(mod), r[1]));
-    bnAllowAssemblyKernel(true);
+    cpuAllowFeature(CpuFeature::kBmi2Adx, true);
     ASSERT_TRUE(bnModExpPortable(num(base), num(exp), num(mod), r[2]));
     BnPreparedModulus* prepared = bnPrepareModulus(num(mod));
     ASSERT_EQ(prepared != nullptr, std::string("13579BDF").find(mod.back()) != std::string::npos) << mod;

@@ -8,6 +8,7 @@
 #include <string>
 #include <vector>
 
+#include "crypto/cpu_features.h"
 #include "crypto/md5.h"
 #include "crypto/sha1.h"
 #include "support/vector_file.h"
@@ -57,8 +58,11 @@ void checkAgainstOpenSsl() {
 
 class Sha1Compression : public ::testing::TestWithParam<bool> {
  protected:
-  void SetUp() override { sha1AllowHardware(GetParam()); }
-  void TearDown() override { sha1AllowHardware(true); }
+  void SetUp() override {
+    cpuAllowFeature(CpuFeature::kShaNi, GetParam());
+    ASSERT_TRUE(GetParam() || !cpuFeatureUsable(CpuFeature::kShaNi)) << "the portable run must be portable";
+  }
+  void TearDown() override { cpuAllowFeature(CpuFeature::kShaNi, true); }
 };
 
 TEST_P(Sha1Compression, MatchesOpenSslEveryWayOfFeeding) { checkAgainstOpenSsl<Sha1>(); }

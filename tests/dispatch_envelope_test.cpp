@@ -67,10 +67,10 @@ TEST_F(KnownRandom, EnvelopeMatchesOpenSslAssemblyForEachDrop) {
   // A long content under the 2048-bit key: base64 without line breaks, and the server opens it.
   const std::string content(3000, 'z'), encModulus = encKey().modulusHex();
   SecureBuffer out;
-  ASSERT_EQ(digitalEnvelope(512, encModulus.c_str(), bytesOf(content).data(), content.size(), &out), 0);
+  ASSERT_EQ(digitalEnvelope(kEnvelopeDrop, encModulus.c_str(), bytesOf(content).data(), content.size(), &out), 0);
   EXPECT_EQ(text(out).find_first_of("\r\n"), std::string::npos);
   std::string opened, error;
-  ASSERT_TRUE(server::openEnvelope(text(out), encKey(), 512, &opened, &error)) << error;
+  ASSERT_TRUE(server::openEnvelope(text(out), encKey(), kEnvelopeDrop, &opened, &error)) << error;
   EXPECT_EQ(opened, content);
 }
 

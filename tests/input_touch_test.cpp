@@ -58,22 +58,23 @@ TEST(TouchEdges, MarginsOnANonSquareSurface) {
 
 // 100 x 40: keys 10 wide. Row 1 dead zones are x <= 3 and x >= 93; row 2 has shift below 15
 // and delete above 85; row 3 has switch below 25, space below 75, then done.
-const EdgeCase kBorderCases[] = {
-    {"row1LeftDeadZone", 3.0f, 15.0f, 0, ""},
-    {"row1FirstKey", std::nextafter(3.0f, 4.0f), 15.0f, 0, "a"},
-    {"row1RightDeadZone", 93.0f, 15.0f, 0, ""},
-    {"row1LastKey", std::nextafter(93.0f, 0.0f), 15.0f, 0, "l"},
-    {"row1KeyBorder", 13.0f, 15.0f, 0, "s"},
-    {"row0KeyBorder", 10.0f, 5.0f, 0, "w"},
-    {"row1TopBorder", 50.0f, 10.0f, 0, "g"},
-    {"shiftBelow15", std::nextafter(15.0f, 0.0f), 25.0f, 0, ""},
-    {"firstRow2KeyAt15", 15.0f, 25.0f, 0, "z"},
-    {"lastRow2Key", std::nextafter(85.0f, 0.0f), 25.0f, 0, "m"},
-    {"row2At85HoldsNoKey", 85.0f, 25.0f, 0, ""},
-    {"spaceAt25", 25.0f, 35.0f, 0, " "},
-    {"switchBelow25", std::nextafter(25.0f, 0.0f), 35.0f, 0, ""},
-    {"doneAt75", 75.0f, 35.0f, 1, ""},
-    {"spaceBelow75", std::nextafter(75.0f, 0.0f), 35.0f, 0, " "},
+struct BorderCase {
+  const char* name;
+  float x, y;
+  int result;            // of the up
+  const char* appended;  // the content afterwards
+  unsigned shiftOn, symbolPage;
+};
+
+const BorderCase kBorderCases[] = {
+    {"row1LeftDeadZone", 3.0f, 15.0f, 0, "", 0, 0},        {"row1FirstKey", std::nextafter(3.0f, 4.0f), 15.0f, 0, "a", 0, 0},
+    {"row1RightDeadZone", 93.0f, 15.0f, 0, "", 0, 0},      {"row1LastKey", std::nextafter(93.0f, 0.0f), 15.0f, 0, "l", 0, 0},
+    {"row1KeyBorder", 13.0f, 15.0f, 0, "s", 0, 0},         {"row0KeyBorder", 10.0f, 5.0f, 0, "w", 0, 0},
+    {"row1TopBorder", 50.0f, 10.0f, 0, "g", 0, 0},         {"shiftBelow15", std::nextafter(15.0f, 0.0f), 25.0f, 0, "", 1, 0},
+    {"firstRow2KeyAt15", 15.0f, 25.0f, 0, "z", 0, 0},      {"lastRow2Key", std::nextafter(85.0f, 0.0f), 25.0f, 0, "m", 0, 0},
+    {"row2At85HoldsNoKey", 85.0f, 25.0f, 0, "", 0, 0},     {"spaceAt25", 25.0f, 35.0f, 0, " ", 0, 0},
+    {"switchBelow25", std::nextafter(25.0f, 0.0f), 35.0f, 0, "", 0, 1}, {"doneAt75", 75.0f, 35.0f, 1, "", 0, 0},
+    {"spaceBelow75", std::nextafter(75.0f, 0.0f), 35.0f, 0, " ", 0, 0},
 };
 
 TEST(TouchEdges, KeyBorders) {
@@ -83,8 +84,8 @@ TEST(TouchEdges, KeyBorders) {
     setFinishMode(kb.session(), 1);
     EXPECT_EQ(press(kb.session(), c.x, c.y), c.result);
     EXPECT_EQ(kb.text(), c.appended);
-    EXPECT_EQ(kb.session().shiftOn, c.x < 15.0f && c.y > 20.0f && c.y < 30.0f ? 1u : 0u);
-    EXPECT_EQ(kb.session().symbolPage, c.x < 25.0f && c.y > 30.0f ? 1u : 0u);
+    EXPECT_EQ(kb.session().shiftOn, c.shiftOn);
+    EXPECT_EQ(kb.session().symbolPage, c.symbolPage);
   }
 }
 
@@ -121,23 +122,31 @@ TEST(TouchModes, SwitchModeOneOpensTheDigitPad) {
 }
 
 TEST(TouchModes, NumberPadCells) {
-  for (std::int16_t type : {1, 2}) {
-    SCOPED_TRACE(type);
+  // Cell (3, 1) is the point and (3, 2) done on the pad with a point (type 1) only.
+  const struct {
+    std::int16_t type;
+    unsigned highlightAfterDown;
+    int up;
+    const char* text;
+    std::size_t lengthAfterDelete;
+  } cases[] = {{1, 0, 1, "1.", 1}, {2, 1, 0, "1", 0}};
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.type);
     ScopedKeyboard kb("padcells", 1000, 400);
     KeyboardSession& s = kb.session();
     setFinishMode(s, 1);
-    setKbdType(s, type);
+    setKbdType(s, c.type);
     const KeyGrid grid(1000, 400);
     Typist typist(s, grid);
     EXPECT_EQ(typist.tap(grid.padCell(0, 0)), 0);
-    EXPECT_EQ(typist.tap(grid.padCell(3, 1)), 0);  // "."
+    EXPECT_EQ(typist.tap(grid.padCell(3, 1)), 0);
     touch(s, kDown, grid.padCell(3, 2).x, grid.padCell(3, 2).y);
-    EXPECT_EQ(s.keyReleased[3], type == 2 ? 1u : 0u);
-    EXPECT_EQ(touch(s, kUp, grid.padCell(3, 2).x, grid.padCell(3, 2).y), type == 1 ? 1 : 0);
-    EXPECT_EQ(kb.text(), type == 1 ? "1." : "1");
+    EXPECT_EQ(s.keyReleased[3], c.highlightAfterDown);
+    EXPECT_EQ(touch(s, kUp, grid.padCell(3, 2).x, grid.padCell(3, 2).y), c.up);
+    EXPECT_EQ(kb.text(), c.text);
     for (int row : {2, 3}) EXPECT_EQ(typist.tap(grid.padCell(row, 3)), 1) << "done spans rows 2 and 3";
     EXPECT_EQ(typist.tap(grid.padCell(0, 3)), 0);  // delete
-    EXPECT_EQ(kb.length(), type == 1 ? 1u : 0u);
+    EXPECT_EQ(kb.length(), c.lengthAfterDelete);
   }
 }
 

@@ -17,7 +17,7 @@ get_target_property(TESSEL_JNI_HEADER_DIR tessel_jni_headers INTERFACE_INCLUDE_D
 # Compile-only: every Java_* definition against the javac-generated declaration.
 add_library(tessel_jni_signatures OBJECT "${TESSEL_JVM_DIR}/jni_signatures.cpp")
 target_include_directories(tessel_jni_signatures PRIVATE
-  "${PROJECT_SOURCE_DIR}/src" ${TESSEL_JNI_INCLUDE} ${TESSEL_JNI_MD_HINT})
+  "${PROJECT_SOURCE_DIR}/src" ${TESSEL_GENERATED_DIR} ${TESSEL_JNI_INCLUDE} ${TESSEL_JNI_MD_HINT})
 target_link_libraries(tessel_jni_signatures PRIVATE tessel_jni_headers)
 target_compile_options(tessel_jni_signatures PRIVATE ${TESSEL_WARNINGS})
 
@@ -35,7 +35,7 @@ endif()
 # Test-only JNI helpers: an offscreen GLES 1.1 context per renderer thread, and the core's
 # dispatcher for the types the native methods never pass (its copy of the core is not exported).
 add_library(tessel_jvm_helpers SHARED "${TESSEL_JVM_DIR}/native/egl_helper.cpp" "${TESSEL_JVM_DIR}/native/dispatch_helper.cpp")
-target_include_directories(tessel_jvm_helpers PRIVATE ${TESSEL_JNI_INCLUDE} ${TESSEL_JNI_MD_HINT})
+target_include_directories(tessel_jvm_helpers PRIVATE ${TESSEL_JNI_INCLUDE} ${TESSEL_JNI_MD_HINT} ${PROJECT_SOURCE_DIR}/tools)
 target_link_libraries(tessel_jvm_helpers PRIVATE tessel_core ${TESSEL_EGL_LIBRARY} ${TESSEL_GLES_LIBRARY})
 target_link_options(tessel_jvm_helpers PRIVATE "-Wl,--exclude-libs,ALL")
 target_compile_options(tessel_jvm_helpers PRIVATE ${TESSEL_WARNINGS})

@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "render/image_table.h"
+#include "render/sampled_fractions.h"
 
 namespace tessel {
 namespace {
@@ -23,10 +24,11 @@ TEST(Artwork, KeyFacesLiveWhereSampledAndHeldFacesStandOut) {
     const char* name;
     const TextureImage &released, &held;
     double s, t;  // sampled fraction of width and height
-  } pairs[] = {{"char", kCharKeys[0], kCharKeys[1], 0.625, 0.625},
-               {"shift/delete", kShiftDeleteKeys[0], kShiftDeleteKeys[1], 0.9375, 0.625},
-               {"switch", kSwitchKeys[0], kSwitchKeys[1], 0.9765, 0.625}, {"done", kDoneKeys[0], kSwitchKeys[1], 0.9765, 0.625},
-               {"space", kSpaceKeys[0], kSpaceKeys[1], 1.0, 0.625}, {"pad", kPadKeys[0], kPadKeys[1], 1.0, 1.0},
+  } pairs[] = {{"char", kCharKeys[0], kCharKeys[1], render::kSquareWidth, render::kSampledHeight},
+               {"shift/delete", kShiftDeleteKeys[0], kShiftDeleteKeys[1], render::kShiftWidth, render::kSampledHeight},
+               {"switch", kSwitchKeys[0], kSwitchKeys[1], render::kBarWidth, render::kSampledHeight},
+               {"done", kDoneKeys[0], kSwitchKeys[1], render::kBarWidth, render::kSampledHeight},
+               {"space", kSpaceKeys[0], kSpaceKeys[1], 1.0, render::kSampledHeight}, {"pad", kPadKeys[0], kPadKeys[1], 1.0, 1.0},
                {"pad done", kPadDoneKeys[0], kPadDoneKeys[1], 1.0, 1.0}};
   for (const Pair& p : pairs) {
     SCOPED_TRACE(p.name);

@@ -18,15 +18,15 @@
 #include "render/image_table.h"
 #include "render/surfaces.h"
 #include "session/session.h"
-#include "support/egl_context.h"
-#include "support/png_file.h"
+#include "common/egl_pbuffer.h"
+#include "common/png_file.h"
 
 namespace tessel {
 extern std::int32_t (*cursorClockMicros)();
 
 namespace {
 
-using test::GlesContext;
+using host::GlesContext;
 
 constexpr int kPopH = 180;  // pop-ups: one key row above the keyboard
 
@@ -226,9 +226,9 @@ TEST(KeyPictures, EveryStateShowsTheReviewedPictureOnEveryKey) {
     }
     const int top = shot.h - kb.h;  // the keyboard's first row in the stacked picture
     const std::string path = std::string(TESSEL_SOURCE_DIR "/docs/screenshots/") + TESSEL_TEST_THEME + "/" + st.name + ".png";
-    if (update && test::writePng(path, shot.w, shot.h, shot.px)) continue;
+    if (update && host::writePng(path, shot.w, shot.h, shot.px)) continue;
     Shot ref;
-    ASSERT_TRUE(test::readPng(path, ref.w, ref.h, ref.px)) << "no reviewed " << path;
+    ASSERT_TRUE(host::readPng(path, ref.w, ref.h, ref.px)) << "no reviewed " << path;
     ASSERT_EQ(ref.w * 10000 + ref.h, shot.w * 10000 + shot.h) << "size of the reviewed picture";
     std::vector<Region> regions = regionsOf(st, kb);
     const double cols = st.setup.type == 0 ? 10 : 4, cw = kb.w / cols, ch = kb.h / 4.0;

@@ -23,13 +23,15 @@
 #include "com_qn_tessel_plugin_QNKbdJniLib.h"
 #include "server/envelope.h"
 #include "session/session.h"
-#include "support/egl_context.h"
+#include "common/egl_pbuffer.h"
 #include "support/openssl_oracle.h"
 
 #define JNI(method) Java_com_qn_tessel_plugin_QNKbdJniLib_##method
 
 namespace tessel::test {
 namespace {
+
+using host::GlesContext;
 
 // ---- a JNIEnv with only what the entry points call: strings and byte arrays as plain objects
 
@@ -102,7 +104,6 @@ bool takeBytes(jbyteArray a) {
 // ---- the app's side
 
 constexpr int kWidth = 320, kHeight = 200;  // keys 32 x 50 pixels
-constexpr int kSlots = 20;
 
 int openKeyboard(const std::string& name) {
   const int h = JNI(createNativeSession)(env(), nullptr, Arg(name));
@@ -152,7 +153,7 @@ std::optional<std::string> everyGetter(int h) {
 }
 
 void destroyAll() {
-  for (int h = 0; h < kSlots; ++h) JNI(destroyNativeSession)(env(), nullptr, h);
+  for (int h = 0; h < kSessionSlots; ++h) JNI(destroyNativeSession)(env(), nullptr, h);
 }
 
 // A GL thread: draws the three surfaces of whatever handle `target` holds, re-creating them now

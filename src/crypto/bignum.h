@@ -61,6 +61,9 @@ bool bnDivide(const BigNumber& a, const BigNumber& b, BigNumber& quotient,
 // has a 128-bit type); even moduli reduce each product by division. False for a zero modulus.
 // CT: the Montgomery products and their final subtractions do not branch on the base; the
 // exponent's bits, the reading of the base and the even-modulus path do (public exponents only).
+// On x86-64 CPUs with BMI2 and ADX the 64-bit Montgomery rows, reductions and final
+// subtractions run in small assembly kernels; cpuAllowFeature(CpuFeature::kBmi2Adx, false)
+// (cpu_features.h) forces the portable C rows for exponentiations started afterwards.
 bool bnModExp(const BigNumber& base, const BigNumber& exponent, const BigNumber& modulus,
               BigNumber& result) noexcept;
 
@@ -78,11 +81,5 @@ void bnReleasePrepared(BnPreparedModulus* prepared) noexcept;
 // bnModExp with the prepared modulus; the same result, without the per-modulus set-up.
 bool bnModExpPrepared(const BigNumber& base, const BigNumber& exponent, const BnPreparedModulus& prepared,
                       BigNumber& result) noexcept;
-
-// On x86-64 CPUs with BMI2 and ADX the 64-bit Montgomery rows, reductions and final
-// subtractions run in small assembly kernels.
-// Tests and benchmarks pass false to force the portable C rows (the default is true), so both
-// are checked on such machines. Affects exponentiations started afterwards.
-void bnAllowAssemblyKernel(bool allowed) noexcept;
 
 }  // namespace tessel

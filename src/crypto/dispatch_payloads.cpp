@@ -96,10 +96,7 @@ ErrorCode hashedValuePayload(int type, const char* enc, const std::uint8_t* valu
 
 // Lower-case hex of MD5(data).
 ErrorCode md5Hex(const std::uint8_t* data, std::size_t n, SecureBuffer* out) noexcept {
-  std::uint8_t digest[16];
-  md5(data, n, digest);
-  SecureBuffer hex = hexEncodeLower(digest, sizeof digest);
-  wipeObject(digest);
+  SecureBuffer hex = md5HexLower(data, n);
   if (!hex) return kErrBinaryToHex;
   *out = std::move(hex);
   return kOk;

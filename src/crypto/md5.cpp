@@ -6,6 +6,7 @@
 #include <cstring>
 
 #include "crypto/block_buffer.h"
+#include "crypto/codec.h"
 #include "crypto/wipe.h"
 
 namespace tessel {
@@ -117,10 +118,15 @@ void compress(std::uint32_t state[4], const std::uint8_t* block, std::size_t blo
   secureWipe(x, sizeof(x));
 }
 
+// The compression over a context's state, as block_buffer.h calls it.
+auto compressInto(Md5Context& ctx) noexcept {
+  return [&ctx](const std::uint8_t* blocks, std::size_t count) { compress(ctx.state, blocks, count); };
+}
+
 }  // namespace
 
 void md5Init(Md5Context& ctx) noexcept {
-  ctx.lengthLow = ctx.lengthHigh = 0;
+  ctx.length = 0;
   ctx.state[0] = 0x67452301u;
   ctx.state[1] = 0xefcdab89u;
   ctx.state[2] = 0x98badcfeu;
@@ -129,39 +135,28 @@ void md5Init(Md5Context& ctx) noexcept {
 }
 
 void md5Update(Md5Context& ctx, const void* data, std::uint32_t length) noexcept {
-  if (length == 0) return;
-  const std::uint8_t* p = static_cast<const std::uint8_t*>(data);
-  std::size_t used = ctx.lengthLow & 63;
-  const std::uint64_t bytes =
-      (static_cast<std::uint64_t>(ctx.lengthHigh) << 32 | ctx.lengthLow) + length;
-  ctx.lengthLow = static_cast<std::uint32_t>(bytes);
-  ctx.lengthHigh = static_cast<std::uint32_t>(bytes >> 32);
-  absorbBlocks(ctx.block, used, p, length,
-               [&ctx](const std::uint8_t* blocks, std::size_t count) { compress(ctx.state, blocks, count); });
+  absorb(ctx.block, ctx.length, data, length, compressInto(ctx));
 }
 
 void md5Final(Md5Context& ctx, std::uint8_t digest[16]) noexcept {
-  std::size_t used = ctx.lengthLow & 63;
-  ctx.block[used++] = 0x80;
-  if (used > 56) {
-    std::memset(ctx.block + used, 0, 64 - used);
-    compress(ctx.state, ctx.block, 1);
-    used = 0;
-  }
-  std::memset(ctx.block + used, 0, 56 - used);
-  // The bit length: the byte count times eight, as a 64-bit little-endian value.
-  store32le(ctx.block + 56, ctx.lengthLow << 3);
-  store32le(ctx.block + 60, (ctx.lengthHigh << 3) | (ctx.lengthLow >> 29));
-  compress(ctx.state, ctx.block, 1);
+  padFinalBlock(ctx.block, ctx.length, LengthOrder::kLittleEndian, compressInto(ctx));
   for (int i = 0; i < 4; ++i) store32le(digest + 4 * i, ctx.state[i]);
 }
 
 void md5(const void* data, std::size_t length, std::uint8_t digest[16]) noexcept {
   Md5Context ctx;
   md5Init(ctx);
-  absorbInSlices(data, length, [&ctx](const std::uint8_t* p, std::uint32_t n) { md5Update(ctx, p, n); });
+  absorb(ctx.block, ctx.length, data, length, compressInto(ctx));
   md5Final(ctx, digest);
   wipeObject(ctx);
+}
+
+SecureBuffer md5HexLower(const void* data, std::size_t length) noexcept {
+  std::uint8_t digest[16];
+  md5(data, length, digest);
+  SecureBuffer hex = hexEncodeLower(digest, sizeof digest);
+  wipeObject(digest);
+  return hex;
 }
 
 }  // namespace tessel

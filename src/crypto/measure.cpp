@@ -2,23 +2,15 @@
 // a ContentGuard, so it is unsealed only for the digest and resealed on the way out.
 #include "crypto/measure.h"
 
-#include "crypto/codec.h"
 #include "crypto/md5.h"
-#include "crypto/wipe.h"
 #include "session/session.h"
 
 namespace tessel {
 
 SecureBuffer computeMeasureValue(KeyboardSession& session) noexcept {
   if (session.content->length == 0) return SecureBuffer();
-  std::uint8_t digest[16];
-  {
-    ContentGuard guard(*session.content);
-    md5(guard.text(), guard.length(), digest);
-  }
-  SecureBuffer text = hexEncodeLower(digest, sizeof digest);
-  wipeObject(digest);
-  return text;
+  ContentGuard guard(*session.content);
+  return md5HexLower(guard.text(), guard.length());
 }
 
 }  // namespace tessel

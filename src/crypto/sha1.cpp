@@ -1,20 +1,19 @@
 // SHA-1 (FIPS 180-4): portable compression with the message schedule kept as a rolling
 // 16-word window, fully unrolled so the round functions and constants are fixed per step;
 // on x86-64 CPUs with the SHA extensions the blocks go through those instructions instead
-// (picked once from CPUID; sha1AllowHardware(false) forces the portable code for tests).
+// (CpuFeature::kShaNi of cpu_features.h, which tests turn off to check the portable code).
 // The context holds message-derived state: sha1() wipes its own, callers wipe theirs.
 #include "crypto/sha1.h"
 
-#include <atomic>
 #include <cstring>
 
 #if defined(__x86_64__) && (defined(__GNUC__) || defined(__clang__))
 #define TESSEL_HAVE_SHA_NI 1
-#include <cpuid.h>
 #include <immintrin.h>
 #endif
 
 #include "crypto/block_buffer.h"
+#include "crypto/cpu_features.h"
 #include "crypto/wipe.h"
 
 namespace tessel {
@@ -147,32 +146,21 @@ __attribute__((target("sha,sse4.1,ssse3"))) void compressShaNi(std::uint32_t sta
 #undef SHA1NI_ROUNDS
 #undef SHA1NI_EXTEND
 #undef SHA1NI_LOAD
-
-bool cpuHasShaNi() noexcept {
-  unsigned a = 0, b = 0, c = 0, d = 0;
-  if (!__get_cpuid(1, &a, &b, &c, &d)) return false;
-  const bool ssse3 = (c & (1u << 9)) != 0, sse41 = (c & (1u << 19)) != 0;
-  if (!__get_cpuid_count(7, 0, &a, &b, &c, &d)) return false;
-  return ssse3 && sse41 && (b & (1u << 29)) != 0;
-}
 #endif
-
-std::atomic<bool> g_hardwareAllowed{true};
 
 void compress(std::uint32_t state[5], const std::uint8_t* block, std::size_t blocks) noexcept {
 #if defined(TESSEL_HAVE_SHA_NI)
-  static const bool available = cpuHasShaNi();
-  if (available && g_hardwareAllowed.load(std::memory_order_relaxed))
-    return compressShaNi(state, block, blocks);
+  if (cpuFeatureUsable(CpuFeature::kShaNi)) return compressShaNi(state, block, blocks);
 #endif
   compressPortable(state, block, blocks);
 }
 
-}  // namespace
-
-void sha1AllowHardware(bool allowed) noexcept {
-  g_hardwareAllowed.store(allowed, std::memory_order_relaxed);
+// The compression over a context's state, as block_buffer.h calls it.
+auto compressInto(Sha1Context& ctx) noexcept {
+  return [&ctx](const std::uint8_t* blocks, std::size_t count) { compress(ctx.state, blocks, count); };
 }
+
+}  // namespace
 
 void sha1Init(Sha1Context& ctx) noexcept {
   ctx.state[0] = 0x67452301u;
@@ -180,41 +168,23 @@ void sha1Init(Sha1Context& ctx) noexcept {
   ctx.state[2] = 0x98BADCFEu;
   ctx.state[3] = 0x10325476u;
   ctx.state[4] = 0xC3D2E1F0u;
-  ctx.lengthLow = ctx.lengthHigh = 0;
+  ctx.length = 0;
   std::memset(ctx.block, 0, sizeof(ctx.block));
 }
 
 void sha1Update(Sha1Context& ctx, const void* data, std::uint32_t length) noexcept {
-  if (length == 0) return;
-  const std::uint8_t* p = static_cast<const std::uint8_t*>(data);
-  std::size_t used = (ctx.lengthLow >> 3) & 63;
-  const std::uint64_t bits = (static_cast<std::uint64_t>(ctx.lengthHigh) << 32 | ctx.lengthLow) +
-                             (static_cast<std::uint64_t>(length) << 3);
-  ctx.lengthLow = static_cast<std::uint32_t>(bits);
-  ctx.lengthHigh = static_cast<std::uint32_t>(bits >> 32);
-  absorbBlocks(ctx.block, used, p, length,
-               [&ctx](const std::uint8_t* blocks, std::size_t count) { compress(ctx.state, blocks, count); });
+  absorb(ctx.block, ctx.length, data, length, compressInto(ctx));
 }
 
 void sha1Final(Sha1Context& ctx, std::uint8_t digest[20]) noexcept {
-  std::size_t used = (ctx.lengthLow >> 3) & 63;
-  ctx.block[used++] = 0x80;
-  if (used > 56) {
-    std::memset(ctx.block + used, 0, 64 - used);
-    compress(ctx.state, ctx.block, 1);
-    used = 0;
-  }
-  std::memset(ctx.block + used, 0, 56 - used);
-  store32be(ctx.block + 56, ctx.lengthHigh);
-  store32be(ctx.block + 60, ctx.lengthLow);
-  compress(ctx.state, ctx.block, 1);
+  padFinalBlock(ctx.block, ctx.length, LengthOrder::kBigEndian, compressInto(ctx));
   for (int i = 0; i < 5; ++i) store32be(digest + 4 * i, ctx.state[i]);
 }
 
 void sha1(const void* data, std::size_t length, std::uint8_t digest[20]) noexcept {
   Sha1Context ctx;
   sha1Init(ctx);
-  absorbInSlices(data, length, [&ctx](const std::uint8_t* p, std::uint32_t n) { sha1Update(ctx, p, n); });
+  absorb(ctx.block, ctx.length, data, length, compressInto(ctx));
   sha1Final(ctx, digest);
   wipeObject(ctx);
 }

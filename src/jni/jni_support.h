@@ -13,11 +13,7 @@
 
 #include "crypto/secure_buffer.h"
 
-namespace tessel {
-
-struct KeyboardSession;
-
-namespace jni {
+namespace tessel::jni {
 
 // Result of a refused call, for the entry points that return something.
 constexpr jint kRefused = -1;
@@ -104,5 +100,4 @@ inline void shieldVoid(F&& body) noexcept {
   }
 }
 
-}  // namespace jni
-}  // namespace tessel
+}  // namespace tessel::jni

@@ -15,6 +15,7 @@
 #include "crypto/error_table.h"
 #include "crypto/measure.h"
 #include "jni/jni_support.h"
+#include "jni/version.h"
 #include "pattern/strength.h"
 #include "render/surfaces.h"
 #include "session/output.h"
@@ -27,9 +28,6 @@ using tessel::SessionRef;
 namespace jni = tessel::jni;
 
 namespace {
-
-constexpr jlong kVersionNumber = 3070005;
-constexpr const char* kVersionText = "3.7.0.5";
 
 // Encryption types of the two content outputs.
 constexpr int kContentType = 48;
@@ -200,13 +198,13 @@ JNIEXPORT jint JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_getNativeVerify(JNI
 
 // The version answers for any non-negative handle, live session or not.
 JNIEXPORT jlong JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_getNativeVersion(JNIEnv*, jclass, jint handle) {
-  return handle < 0 ? jlong{jni::kRefused} : kVersionNumber;
+  return handle < 0 ? jlong{jni::kRefused} : jlong{TESSEL_VERSION_NUMBER};
 }
 
 JNIEXPORT jstring JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_getNativeStringVersion(JNIEnv* env, jclass,
                                                                                        jint handle) {
   if (handle < 0) return nullptr;
-  return jni::newJavaString(env, kVersionText);
+  return jni::newJavaString(env, TESSEL_VERSION_TEXT);
 }
 
 JNIEXPORT jstring JNICALL Java_com_qn_tessel_plugin_QNKbdJniLib_getNativeLastError(JNIEnv* env, jclass,

@@ -25,26 +25,31 @@ namespace {
 
 constexpr jint kNotStored = 0;
 
-// Runs op(session, chars) for a live session and a readable string; otherwise does nothing.
-template <typename Op>
-void withText(JNIEnv* env, jint handle, jstring text, Op op) noexcept {
-  if (text == nullptr || handle < 0) return;
+// Runs op(session, chars) for a live session and a readable string and returns its result, or
+// `refused` without running it (and when it throws).
+template <typename R, typename Op>
+R withText(JNIEnv* env, jint handle, jstring text, R refused, Op op) noexcept {
+  if (text == nullptr || handle < 0) return refused;
   jni::Utf8Chars chars(env, text);
-  if (chars.get() == nullptr) return;
+  if (chars.get() == nullptr) return refused;
   SessionRef s(handle, Access::kExclusive);
-  if (!s) return;
-  jni::shieldVoid([&] { op(*s, chars.get()); });
+  if (!s) return refused;
+  return jni::shield<R>(refused, [&] { return static_cast<R>(op(*s, chars.get())); });
 }
 
-// The same for the public-key setters, which report 1 (taken) or 0 (refused).
+// The setters that report nothing.
+template <typename Op>
+void withText(JNIEnv* env, jint handle, jstring text, Op op) noexcept {
+  withText(env, handle, text, false, [&op](KeyboardSession& s, const char* t) {
+    op(s, t);
+    return true;
+  });
+}
+
+// The public-key setters, which report 1 (taken) or 0 (refused).
 template <typename Op>
 jint keyText(JNIEnv* env, jint handle, jstring text, Op op) noexcept {
-  if (text == nullptr || handle < 0) return kNotStored;
-  jni::Utf8Chars chars(env, text);
-  if (chars.get() == nullptr) return kNotStored;
-  SessionRef s(handle, Access::kExclusive);
-  if (!s) return kNotStored;
-  return jni::shield<jint>(kNotStored, [&] { return static_cast<jint>(op(*s, chars.get())); });
+  return withText(env, handle, text, kNotStored, op);
 }
 
 template <typename Op>

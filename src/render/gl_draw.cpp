@@ -1,14 +1,16 @@
 // The unit quad, the texture-coordinate sets and the small GL sequences every surface repeats.
 #include "render/gl_draw.h"
 
+#include "render/sampled_fractions.h"
+
 namespace tessel::render {
 
 const GLfloat kUnitQuad[12] = {-1.0f, 1.0f, -0.0f, 1.0f, 1.0f, -0.0f, -1.0f, -1.0f, -0.0f, 1.0f, -1.0f, -0.0f};
 const GLfloat kFullSet[8] = {0.0f, 0.0f, 1.0f, 0.0f, 0.0f, 1.0f, 1.0f, 1.0f};
-const GLfloat kWideSet[8] = {0.0f, 0.0f, 1.0f, 0.0f, 0.0f, 0.625f, 1.0f, 0.625f};
-const GLfloat kSquareSet[8] = {0.0f, 0.0f, 0.625f, 0.0f, 0.0f, 0.625f, 0.625f, 0.625f};
-const GLfloat kShiftSet[8] = {0.0f, 0.0f, 0.9375f, 0.0f, 0.0f, 0.625f, 0.9375f, 0.625f};
-const GLfloat kBarSet[8] = {0.0f, 0.0f, 0.9765f, 0.0f, 0.0f, 0.625f, 0.9765f, 0.625f};
+const GLfloat kWideSet[8] = {0.0f, 0.0f, 1.0f, 0.0f, 0.0f, kSampledHeight, 1.0f, kSampledHeight};
+const GLfloat kSquareSet[8] = {0.0f, 0.0f, kSquareWidth, 0.0f, 0.0f, kSampledHeight, kSquareWidth, kSampledHeight};
+const GLfloat kShiftSet[8] = {0.0f, 0.0f, kShiftWidth, 0.0f, 0.0f, kSampledHeight, kShiftWidth, kSampledHeight};
+const GLfloat kBarSet[8] = {0.0f, 0.0f, kBarWidth, 0.0f, 0.0f, kSampledHeight, kBarWidth, kSampledHeight};
 
 void drawQuad(GLuint texture, const GLfloat* texCoords, bool resetMatrix) {
   glBindTexture(GL_TEXTURE_2D, texture);

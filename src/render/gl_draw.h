@@ -6,7 +6,8 @@
 // (S and T below), textured with one of five texture-coordinate sets, and followed by
 // glLoadIdentity. A texture-coordinate t of 0 is the image's first row, the top of the quad.
 //
-// Texture-coordinate sets (s, t of vertices top-left, top-right, bottom-left, bottom-right):
+// Texture-coordinate sets (s, t of vertices top-left, top-right, bottom-left, bottom-right; the
+// fractions are in sampled_fractions.h):
 //   full   whole image                 background, glyphs, icons, labels, pad keys
 //   wide   s 0..1,      t 0..0.625     space key face and label
 //   square s 0..0.625,  t 0..0.625     character key faces

@@ -1,10 +1,9 @@
-// Canvas, signed-distance shapes, FreeType text and PNG output for the artwork generator.
+// Canvas, signed-distance shapes and FreeType text for the artwork generator.
 #include "art_canvas.h"
 
 #include <ft2build.h>
 #include FT_FREETYPE_H
 #include FT_OUTLINE_H
-#include <png.h>
 
 #include <algorithm>
 #include <cmath>
@@ -326,18 +325,6 @@ void drawTextCentered(Canvas& canvas, const TextStyle& style, const std::string&
 
 void drawLabel(Canvas& canvas, const TextStyle& style, const std::string& text, float cx, float cy, Color color) {
   drawTextCentered(canvas, style, text, cx, cy + capHeight(style) / 2, color);
-}
-
-// ---- output
-
-void writePng(const std::string& path, int width, int height, const std::vector<std::uint8_t>& rgba) {
-  png_image image{};
-  image.version = PNG_IMAGE_VERSION;
-  image.width = static_cast<png_uint_32>(width);
-  image.height = static_cast<png_uint_32>(height);
-  image.format = PNG_FORMAT_RGBA;
-  if (!png_image_write_to_file(&image, path.c_str(), 0, rgba.data(), 0, nullptr))
-    throw std::runtime_error("cannot write " + path + ": " + image.message);
 }
 
 }  // namespace artgen

@@ -1,5 +1,5 @@
 // Drawing primitives of the artwork generator: a floating-point RGBA canvas, anti-aliased
-// shapes given as signed distance functions, FreeType text, and RGBA/PNG output.
+// shapes given as signed distance functions, FreeType text, and RGBA output.
 //
 // Design space: every image is drawn in "screen pixels", the size at which the keyboard shows
 // it on the reference surface (1080 x 720, 10 x 4 keys). A canvas maps image pixel (i, j) to
@@ -92,7 +92,5 @@ void drawTextCentered(Canvas& canvas, const TextStyle& style, const std::string&
                       Color color);
 // Draws text whose cap height is centred vertically on cy.
 void drawLabel(Canvas& canvas, const TextStyle& style, const std::string& text, float cx, float cy, Color color);
-
-void writePng(const std::string& path, int width, int height, const std::vector<std::uint8_t>& rgba);
 
 }  // namespace artgen

@@ -25,9 +25,13 @@
 #include <vector>
 
 #include "art_canvas.h"
+#define TESSEL_HAVE_PNG 1  // tessel_artgen is built only where libpng is (CMakeLists.txt)
+#include "../common/png_file.h"
 #include "render/glyph_index.h"
+#include "render/sampled_fractions.h"
 
 using namespace artgen;
+namespace render = tessel::render;
 
 namespace {
 
@@ -41,8 +45,6 @@ struct Theme {
   Color accentTop, accentBottom, text, accentText, dot, cursor;
   std::string font = "DejaVuSans.ttf";
 };
-
-Theme gTheme;
 
 std::uint32_t parseHex(const std::string& word, const std::string& line) {
   if (word.size() != 7 || word[0] != '#' || word.find_first_not_of("0123456789abcdefABCDEF", 1) != std::string::npos)
@@ -91,26 +93,30 @@ Theme readTheme(const std::string& path) {
   return t;
 }
 
-// Colours the pictures use, all derived from the theme.
-Color kBackgroundTop, kBackgroundBottom, kKeyTop, kKeyBottom, kKeyHeldTop, kKeyHeldBottom, kFunctionTop,
-    kFunctionBottom, kAccentTop, kAccentBottom, kKeyShadow, kAmbientShadow, kInk, kLabelInk, kQuietInk, kOnAccent,
-    kAccentInk, kDot, kCursor, kFieldBody, kFieldRule;
+// What the pictures are drawn with: the colours, all derived from the theme once, and the font.
+struct Palette {
+  Color backgroundTop, backgroundBottom, keyTop, keyBottom, keyHeldTop, keyHeldBottom, functionTop, functionBottom;
+  Color accentTop, accentBottom, keyShadow, ambientShadow, ink, labelInk, quietInk, onAccent, accentInk, dot, cursor;
+  Color fieldBody, fieldRule;
+  std::string font;
+};
 
-void applyTheme(const Theme& t) {
-  gTheme = t;
-  kBackgroundTop = t.panelTop, kBackgroundBottom = t.panelBottom;
-  kKeyTop = t.keyTop, kKeyBottom = t.keyBottom, kKeyHeldTop = t.heldTop, kKeyHeldBottom = t.heldBottom;
-  kFunctionTop = t.functionTop, kFunctionBottom = t.functionBottom;
-  kAccentTop = t.accentTop, kAccentBottom = t.accentBottom;
-  Color shadow = mix(t.panelBottom, hex(0x000000), 0.42f);
-  shadow.a = 0.60f;
-  kKeyShadow = shadow;
-  kAmbientShadow = mix(t.panelBottom, hex(0x000000), 0.6f);
-  kAmbientShadow.a = 0.14f;
-  kInk = t.text, kLabelInk = t.text, kQuietInk = mix(t.text, t.keyTop, 0.38f);
-  kOnAccent = t.accentText, kAccentInk = mix(t.accentTop, t.accentBottom, 0.5f);
-  kDot = t.dot, kCursor = t.cursor;
-  kFieldBody = t.keyTop, kFieldRule = mix(t.keyTop, t.text, 0.25f);
+Palette paletteOf(const Theme& t) {
+  Palette p;
+  p.backgroundTop = t.panelTop, p.backgroundBottom = t.panelBottom;
+  p.keyTop = t.keyTop, p.keyBottom = t.keyBottom, p.keyHeldTop = t.heldTop, p.keyHeldBottom = t.heldBottom;
+  p.functionTop = t.functionTop, p.functionBottom = t.functionBottom;
+  p.accentTop = t.accentTop, p.accentBottom = t.accentBottom;
+  p.keyShadow = mix(t.panelBottom, hex(0x000000), 0.42f);
+  p.keyShadow.a = 0.60f;
+  p.ambientShadow = mix(t.panelBottom, hex(0x000000), 0.6f);
+  p.ambientShadow.a = 0.14f;
+  p.ink = t.text, p.labelInk = t.text, p.quietInk = mix(t.text, t.keyTop, 0.38f);
+  p.onAccent = t.accentText, p.accentInk = mix(t.accentTop, t.accentBottom, 0.5f);
+  p.dot = t.dot, p.cursor = t.cursor;
+  p.fieldBody = t.keyTop, p.fieldRule = mix(t.keyTop, t.text, 0.25f);
+  p.font = t.font;
+  return p;
 }
 
 // ---- reference geometry (screen pixels): keys 108 x 180, grid unit 54 x 90
@@ -139,75 +145,75 @@ struct KeyLook {
 
 // A key body filling the design rectangle [0, w] x [0, h] less a hairline margin, with a crisp
 // darker lower edge (the key's "thickness") and a faint ambient shadow.
-void paintKey(Canvas& c, float w, float h, const KeyLook& look, float radius = kKeyRadius) {
+void paintKey(const Palette& pal, Canvas& c, float w, float h, const KeyLook& look, float radius = kKeyRadius) {
   const float x0 = 2.0f, y0 = 1.0f, x1 = w - 2.0f, y1 = h - 3.5f;  // all ink stays inside w x h
   if (look.shadow) {
-    c.fill(roundRect(x0, y0 + 0.5f, x1, y1 + 1.5f, radius), kAmbientShadow, 2.0f);
-    c.fill(roundRect(x0, y0 + 2.0f, x1, y1 + 2.0f, radius), kKeyShadow);
+    c.fill(roundRect(x0, y0 + 0.5f, x1, y1 + 1.5f, radius), pal.ambientShadow, 2.0f);
+    c.fill(roundRect(x0, y0 + 2.0f, x1, y1 + 2.0f, radius), pal.keyShadow);
   }
   c.fillGradient(roundRect(x0, y0, x1, y1, radius), look.top, look.bottom, y0, y1);
 }
 
 // Looks of the key faces (functions: the colours are known only once the theme is read).
-KeyLook charKey() { return {kKeyTop, kKeyBottom}; }
-KeyLook charKeyHeld() { return {kKeyHeldTop, kKeyHeldBottom}; }
-KeyLook functionKey() { return {kFunctionTop, kFunctionBottom}; }
-KeyLook functionKeyHeld() { return {kKeyTop, kKeyBottom}; }  // function keys light up when held
-KeyLook accentKey() { return {kAccentTop, kAccentBottom}; }
+KeyLook charKey(const Palette& pal) { return {pal.keyTop, pal.keyBottom}; }
+KeyLook charKeyHeld(const Palette& pal) { return {pal.keyHeldTop, pal.keyHeldBottom}; }
+KeyLook functionKey(const Palette& pal) { return {pal.functionTop, pal.functionBottom}; }
+KeyLook functionKeyHeld(const Palette& pal) { return {pal.keyTop, pal.keyBottom}; }  // function keys light up when held
+KeyLook accentKey(const Palette& pal) { return {pal.accentTop, pal.accentBottom}; }
 
 // Character key faces: the renderer samples the top-left 80 x 160 of 128 x 256 and shows it
 // at 0.815 x 0.884 of a cell (88 x 159).
-Canvas charKeyFace(const KeyLook& look) {
+Canvas charKeyFace(const Palette& pal, const KeyLook& look) {
   const float w = 0.815f * kKw, h = 0.884f * kKh;
-  Canvas c(128, 256, w / 80.0f, h / 160.0f);
-  paintKey(c, w, h, look);
+  Canvas c(128, 256, w / (render::kSquareWidth * 128), h / (render::kSampledHeight * 256));
+  paintKey(pal, c, w, h, look);
   return c;
 }
 
 // Shift/delete: 120 x 160 of 128 x 256 at 1.5 x 0.753 by 0.884 cells.
-Canvas shiftDeleteFace(const KeyLook& look) {
+Canvas shiftDeleteFace(const Palette& pal, const KeyLook& look) {
   const float w = 2 * 1.5f * 0.753f * kUx, h = 0.884f * kKh;
-  Canvas c(128, 256, w / 120.0f, h / 160.0f);
-  paintKey(c, w, h, look);
+  Canvas c(128, 256, w / (render::kShiftWidth * 128), h / (render::kSampledHeight * 256));
+  paintKey(pal, c, w, h, look);
   return c;
 }
 
 // Switch (and done, whose held picture is this one): 0.9765 x 0.625 of the image, at about
 // 4.5 x 0.9 key widths/heights.
-Canvas barFace(int size, float w, float h, const KeyLook& look) {
-  Canvas c(size, size, w / (0.9765f * size), h / (0.625f * size));
-  paintKey(c, w, h, look);
+Canvas barFace(const Palette& pal, int size, float w, float h, const KeyLook& look) {
+  Canvas c(size, size, w / (render::kBarWidth * size), h / (render::kSampledHeight * size));
+  paintKey(pal, c, w, h, look);
   return c;
 }
 
 // Space: 512 x 160 of 512 x 256, at 9.63 x 0.884 half-keys.
-Canvas spaceFace(const KeyLook& look) {
+Canvas spaceFace(const Palette& pal, const KeyLook& look) {
   const float w = 2 * 5 * 0.963f * kUx, h = 0.884f * kKh;
-  Canvas c(512, 256, w / 512.0f, h / 160.0f);
-  paintKey(c, w, h, look);
+  Canvas c(512, 256, w / 512.0f, h / (render::kSampledHeight * 256));
+  paintKey(pal, c, w, h, look);
   return c;
 }
 
 // Pad keys use the whole image: 256 x 128 shown at 247 x 156.
-Canvas padFace(const KeyLook& look) {
+Canvas padFace(const Palette& pal, const KeyLook& look) {
   const float w = 2 * 0.96065f * kPadUx, h = 2 * 0.93617f * kPadUy;
   Canvas c(256, 128, w / 256.0f, h / 128.0f);
-  paintKey(c, w, h, look, 10.0f);
+  paintKey(pal, c, w, h, look, 10.0f);
   return c;
 }
 
 // The pad's done key covers two rows: 247 x 323 from a square image (pre-distorted corners).
-Canvas padDoneFace(int size, const KeyLook& look) {
+Canvas padDoneFace(const Palette& pal, int size, const KeyLook& look) {
   const float w = 2 * 0.96065f * kPadUx, h = 2 * 2 * 0.96809f * kPadUy;
   Canvas c(size, size, w / size, h / size);
-  paintKey(c, w, h, look, 10.0f);
+  paintKey(pal, c, w, h, look, 10.0f);
   return c;
 }
 
 // The key balloon: drawn over a held key, its head holds the enlarged glyph one key height
 // higher and a short neck joins it to the key. Full image 128 x 256 shown at about
 // 254 x 503 around a point 0.04 key heights above the key's top edge.
-Canvas balloon() {
+Canvas balloon(const Palette& pal) {
   const float halfW = (1 / kAspect) * 1.05f * 0.895f * 1.5f * kUx;
   const float halfH = 2 * 1.054f * 0.884f * 1.5f * kUy;
   Canvas c(128, 256, 2 * halfW / 128, 2 * halfH / 256);
@@ -223,16 +229,16 @@ Canvas balloon() {
   const float neckHalfW = 0.55f * faceHalfW, keyTop = keyCy - faceHalfH;
   const Sdf stem = roundRect(cx - neckHalfW, headBottom - 40.0f, cx + neckHalfW, keyTop + 14.0f, 10.0f);
   const Sdf shape = smoothUnite(head, stem, 18.0f);
-  c.fill(shift(shape, 0, 1.0f), Color{kKeyShadow.r, kKeyShadow.g, kKeyShadow.b, 0.22f}, 7.0f);
-  c.fill(shift(shape, 0, 2.0f), kKeyShadow);
-  c.fill(outline(shape, 0.6f), Color{kFieldRule.r, kFieldRule.g, kFieldRule.b, 0.55f});
-  c.fillGradient(shape, kKeyTop, kKeyBottom, headTop, keyCy + faceHalfH);
+  c.fill(shift(shape, 0, 1.0f), Color{pal.keyShadow.r, pal.keyShadow.g, pal.keyShadow.b, 0.22f}, 7.0f);
+  c.fill(shift(shape, 0, 2.0f), pal.keyShadow);
+  c.fill(outline(shape, 0.6f), Color{pal.fieldRule.r, pal.fieldRule.g, pal.fieldRule.b, 0.55f});
+  c.fillGradient(shape, pal.keyTop, pal.keyBottom, headTop, keyCy + faceHalfH);
   return c;
 }
 
 // ---- glyphs: 64 x 128, the character centred on the image centre
 
-TextStyle glyphStyle(bool lower) { return {gTheme.font, lower ? 73.0f : 68.0f, 2.8f}; }
+TextStyle glyphStyle(const Palette& pal, bool lower) { return {pal.font, lower ? 73.0f : 68.0f, 2.8f}; }
 
 // Narrows a text mask to at most maxWidth columns (area filter) and keeps its height, so a wide
 // character (W, M, m, w, %, @) keeps the cap height or x-height of its group.
@@ -265,20 +271,20 @@ void steepen(TextMask& m) {
   for (std::uint8_t& v : m.coverage) v = static_cast<std::uint8_t>(std::clamp((v - 128) * 2 + 128, 0, 255));
 }
 
-std::vector<std::uint8_t> glyphImage(char ch, bool lower) {
+std::vector<std::uint8_t> glyphImage(const Palette& pal, char ch, bool lower) {
   Canvas c(64, 128);
-  const TextStyle st = glyphStyle(lower);
+  const TextStyle st = glyphStyle(pal, lower);
   const float baseline = lower ? 64.0f + xHeight(st) / 2 + 2.0f : 64.0f + capHeight(st) / 2;
   TextMask m = fitWidth(renderText(st, std::string(1, ch)), 56);
   steepen(m);
-  paintText(c, m, 32.0f, baseline, kInk);
+  paintText(c, m, 32.0f, baseline, pal.ink);
   return c.toRgba8();
 }
 
-void addGlyphGroup(const std::string& name, const std::vector<char>& chars, bool lower) {
+void addGlyphGroup(const Palette& pal, const std::string& name, const std::vector<char>& chars, bool lower) {
   Picture p{name, 64, 128, static_cast<int>(chars.size()), {}};
   for (char ch : chars) {
-    const auto img = glyphImage(ch, lower);
+    const auto img = glyphImage(pal, ch, lower);
     p.rgba.insert(p.rgba.end(), img.begin(), img.end());
   }
   gPictures.push_back(std::move(p));
@@ -303,9 +309,9 @@ std::vector<char> symbolPage(const std::string& pageSet) {
 // key's text stands at one visual size; a label too wide for its image is narrowed, not shrunk.
 constexpr float kLabelCapPx = 30.0f;
 
-Canvas label(int w, int h, float texelPx, const std::string& text, Color ink, float capPx = kLabelCapPx) {
+Canvas label(const Palette& pal, int w, int h, float texelPx, const std::string& text, Color ink, float capPx = kLabelCapPx) {
   Canvas c(w, h);
-  TextStyle st{gTheme.font, 40.0f, 0.0f};
+  TextStyle st{pal.font, 40.0f, 0.0f};
   st.emPixels *= capPx / texelPx / capHeight(st);
   st.embolden = st.emPixels * 0.05f;
   const TextMask m = fitWidth(renderText(st, text), w - 8);
@@ -315,9 +321,9 @@ Canvas label(int w, int h, float texelPx, const std::string& text, Color ink, fl
 
 // Space label: only the top 256 x 80 is sampled and it is magnified about 2.1 to 2.7 times
 // over a quad larger than the key, so the content stays small and central.
-Canvas spaceLabel() {
+Canvas spaceLabel(const Palette& pal) {
   Canvas c(256, 128);
-  const TextStyle st{gTheme.font, 14.5f, 0.9f};
+  const TextStyle st{pal.font, 14.5f, 0.9f};
   const std::string text = "Secure keyboard";
   const TextMask m = renderText(st, text);
   const float lockW = 11.0f, gap = 5.0f;
@@ -329,73 +335,73 @@ Canvas spaceLabel() {
   const float lx = x0 + lockW / 2;
   const Sdf shackle = subtract(outline(roundRect(lx - 3.6f, bodyTop - 8.5f, lx + 3.6f, bodyTop + 4.0f, 3.6f), 1.1f),
                                roundRect(lx - 10, bodyTop + 0.5f, lx + 10, bodyTop + 12, 0));
-  c.fill(unite(shackle, roundRect(x0, bodyTop, x0 + lockW, bodyBottom, 1.8f)), kQuietInk);
+  c.fill(unite(shackle, roundRect(x0, bodyTop, x0 + lockW, bodyBottom, 1.8f)), pal.quietInk);
   c.paintMask(m.coverage, m.width, m.height, static_cast<int>(std::lround(x0 + lockW + gap)),
-              static_cast<int>(std::lround(cy + cap / 2)) - m.top, kQuietInk);
+              static_cast<int>(std::lround(cy + cap / 2)) - m.top, pal.quietInk);
   return c;
 }
 
 const std::vector<float> kArrow = {32, 11, 53, 33, 41.5f, 33, 41.5f, 51, 22.5f, 51, 22.5f, 33, 11, 33};
 
-Canvas shiftIcon(bool on) {
+Canvas shiftIcon(const Palette& pal, bool on) {
   Canvas c(64, 64);
   const Sdf arrow = polygon(kArrow);
-  if (on) c.fill(arrow, kAccentInk);
-  c.fill(outline(arrow, 2.3f), on ? kAccentInk : kLabelInk);
+  if (on) c.fill(arrow, pal.accentInk);
+  c.fill(outline(arrow, 2.3f), on ? pal.accentInk : pal.labelInk);
   return c;
 }
 
-Canvas deleteIcon() {
+Canvas deleteIcon(const Palette& pal) {
   Canvas c(64, 64);
   const Sdf body = polygon({8, 32, 21, 17, 56, 17, 56, 47, 21, 47});
-  c.fill(outline(body, 2.2f), kLabelInk);
-  c.fill(unite(capsule(30, 25, 44, 39, 2.3f), capsule(44, 25, 30, 39, 2.3f)), kLabelInk);
+  c.fill(outline(body, 2.2f), pal.labelInk);
+  c.fill(unite(capsule(30, 25, 44, 39, 2.3f), capsule(44, 25, 30, 39, 2.3f)), pal.labelInk);
   return c;
 }
 
-Canvas symbolShiftIcon() {
-  return label(64, 64, 1.125f, "#+=", kLabelInk, 26.0f);  // shown at 72 x 72 px, narrower than the rest
+Canvas symbolShiftIcon(const Palette& pal) {
+  return label(pal, 64, 64, 1.125f, "#+=", pal.labelInk, 26.0f);  // shown at 72 x 72 px, narrower than the rest
 }
 
 // Keyboard-hide chevron in the lower half of the pad's done key: light, with a dark rim, so it
 // reads on the blue released face and on the white held face alike.
-Canvas padDoneIcon() {
+Canvas padDoneIcon(const Palette& pal) {
   Canvas c(64, 64);
   const Sdf chevron = unite(capsule(19, 26, 32, 39, 3.6f), capsule(32, 39, 45, 26, 3.6f));
-  c.fill(outline(chevron, 1.3f), Color{kAccentBottom.r * 0.5f, kAccentBottom.g * 0.5f, kAccentBottom.b * 0.5f, 0.55f});
-  c.fill(chevron, mix(kOnAccent, kAccentTop, 0.12f));
+  c.fill(outline(chevron, 1.3f), Color{pal.accentBottom.r * 0.5f, pal.accentBottom.g * 0.5f, pal.accentBottom.b * 0.5f, 0.55f});
+  c.fill(chevron, mix(pal.onAccent, pal.accentTop, 0.12f));
   return c;
 }
 
 // ---- pop-up pictures (64 x 64, shown stretched)
 
-Canvas background() {
+Canvas background(const Palette& pal) {
   Canvas c(64, 64);
-  c.fillGradient(roundRect(-10, -10, 74, 74, 0), kBackgroundTop, kBackgroundBottom, 0, 64);
+  c.fillGradient(roundRect(-10, -10, 74, 74, 0), pal.backgroundTop, pal.backgroundBottom, 0, 64);
   return c;
 }
 
 // The text field: stretched about 16 x horizontally and 2 x vertically over the pop-up, so it
 // is built from rows: a hairline on top, white body, a blue underline at the bottom.
-Canvas fieldFrame() {
+Canvas fieldFrame(const Palette& pal) {
   Canvas c(64, 64);
-  c.fill(roundRect(-10, -10, 74, 74, 0), kFieldBody);
-  c.fill(roundRect(-10, -10, 74, 1, 0), kFieldRule);
-  c.fill(roundRect(-10, 1, 74, 2, 0), mix(kFieldBody, kFieldRule, 0.3f));
-  c.fill(roundRect(-10, 60, 74, 61, 0), mix(kFieldBody, kAccentInk, 0.5f));
-  c.fill(roundRect(-10, 61, 74, 74, 0), kAccentInk);
+  c.fill(roundRect(-10, -10, 74, 74, 0), pal.fieldBody);
+  c.fill(roundRect(-10, -10, 74, 1, 0), pal.fieldRule);
+  c.fill(roundRect(-10, 1, 74, 2, 0), mix(pal.fieldBody, pal.fieldRule, 0.3f));
+  c.fill(roundRect(-10, 60, 74, 61, 0), mix(pal.fieldBody, pal.accentInk, 0.5f));
+  c.fill(roundRect(-10, 61, 74, 74, 0), pal.accentInk);
   return c;
 }
 
-Canvas maskDot() {
+Canvas maskDot(const Palette& pal) {
   Canvas c(64, 64);
-  c.fill(circle(32, 32, 16.5f), kDot);
+  c.fill(circle(32, 32, 16.5f), pal.dot);
   return c;
 }
 
-Canvas cursor() {
+Canvas cursor(const Palette& pal) {
   Canvas c(64, 64);
-  c.fill(capsule(32, 7, 32, 57, 4.0f), kCursor);
+  c.fill(capsule(32, 7, 32, 57, 4.0f), pal.cursor);
   return c;
 }
 
@@ -481,53 +487,53 @@ void writeContactSheet(const std::string& path) {
         for (int c = 0; c < 3; ++c) d[c] = static_cast<std::uint8_t>((s[c] * s[3] + d[c] * (255 - s[3])) / 255);
       }
   }
-  writePng(path, sheetW, sheetH, sheet);
+  if (!tessel::host::writePng(path, sheetW, sheetH, sheet)) throw std::runtime_error("cannot write " + path);
 }
 
-void drawEverything() {
-  add("background", background());
-  add("field_frame", fieldFrame());
-  add("mask_dot", maskDot());
-  add("cursor", cursor());
+void drawEverything(const Palette& pal) {
+  add("background", background(pal));
+  add("field_frame", fieldFrame(pal));
+  add("mask_dot", maskDot(pal));
+  add("cursor", cursor(pal));
 
   std::vector<char> lower, upper;
   for (char ch = 'a'; ch <= 'z'; ++ch) lower.push_back(ch);
   for (char ch = 'A'; ch <= 'Z'; ++ch) upper.push_back(ch);
-  addGlyphGroup("glyphs_lower", lower, true);
-  addGlyphGroup("glyphs_upper", upper, false);
-  addGlyphGroup("glyphs_symbols1", symbolPage("`~!@#$%^&*()-_=+"), false);
-  addGlyphGroup("glyphs_symbols2", symbolPage("{}[]\\|:;'\",.<>/?"), false);
+  addGlyphGroup(pal, "glyphs_lower", lower, true);
+  addGlyphGroup(pal, "glyphs_upper", upper, false);
+  addGlyphGroup(pal, "glyphs_symbols1", symbolPage("`~!@#$%^&*()-_=+"), false);
+  addGlyphGroup(pal, "glyphs_symbols2", symbolPage("{}[]\\|:;'\",.<>/?"), false);
   std::vector<char> keypad(10);
   for (char d = '0'; d <= '9'; ++d) keypad.at(tessel::keypadIndexOf(static_cast<std::uint8_t>(d))) = d;
-  addGlyphGroup("glyphs_pad_digits", keypad, false);
+  addGlyphGroup(pal, "glyphs_pad_digits", keypad, false);
 
-  add("key_char", charKeyFace(charKey()));
-  add("key_char_held", charKeyFace(charKeyHeld()));
-  add("key_balloon", balloon());
-  add("key_space", spaceFace(charKey()));
-  add("key_space_held", spaceFace(charKeyHeld()));
-  add("label_space", spaceLabel());
-  add("key_shift_delete", shiftDeleteFace(functionKey()));
-  add("key_shift_delete_held", shiftDeleteFace(functionKeyHeld()));
-  add("key_switch", barFace(256, 2 * 2.25f * kUx, 0.9f * kKh, functionKey()));
-  add("key_switch_held", barFace(256, 2 * 2.28f * kUx, 0.892f * kKh, functionKeyHeld()));
-  add("key_done", barFace(128, 2 * 2.315f * kUx, 0.884f * kKh, accentKey()));
-  add("icon_delete", deleteIcon());
-  add("icon_shift_off", shiftIcon(false));
-  add("icon_shift_on", shiftIcon(true));
-  add("icon_symbol_shift", symbolShiftIcon());
-  add("label_to_letters", label(256, 128, 0.9f, "ABC", kLabelInk));
-  add("label_to_symbols", label(256, 128, 0.9f, "?123", kLabelInk));
-  add("label_done", label(128, 64, 1.01f, "Done", kOnAccent));
-  add("label_done_held", label(128, 64, 1.01f, "Done", kAccentInk));
-  add("label_to_pad", label(256, 128, 0.9f, "123", kLabelInk));
-  add("key_pad", padFace(charKey()));
-  add("key_pad_alt", padFace(functionKey()));
-  add("key_pad_done", padDoneFace(128, accentKey()));
-  add("key_pad_done_held", padDoneFace(256, functionKeyHeld()));
-  add("label_pad_clear", label(128, 64, 0.95f, "Clear", kLabelInk));
-  add("label_pad_ok", label(128, 64, 0.95f, "OK", kAccentInk));
-  add("icon_pad_done", padDoneIcon());
+  add("key_char", charKeyFace(pal, charKey(pal)));
+  add("key_char_held", charKeyFace(pal, charKeyHeld(pal)));
+  add("key_balloon", balloon(pal));
+  add("key_space", spaceFace(pal, charKey(pal)));
+  add("key_space_held", spaceFace(pal, charKeyHeld(pal)));
+  add("label_space", spaceLabel(pal));
+  add("key_shift_delete", shiftDeleteFace(pal, functionKey(pal)));
+  add("key_shift_delete_held", shiftDeleteFace(pal, functionKeyHeld(pal)));
+  add("key_switch", barFace(pal, 256, 2 * 2.25f * kUx, 0.9f * kKh, functionKey(pal)));
+  add("key_switch_held", barFace(pal, 256, 2 * 2.28f * kUx, 0.892f * kKh, functionKeyHeld(pal)));
+  add("key_done", barFace(pal, 128, 2 * 2.315f * kUx, 0.884f * kKh, accentKey(pal)));
+  add("icon_delete", deleteIcon(pal));
+  add("icon_shift_off", shiftIcon(pal, false));
+  add("icon_shift_on", shiftIcon(pal, true));
+  add("icon_symbol_shift", symbolShiftIcon(pal));
+  add("label_to_letters", label(pal, 256, 128, 0.9f, "ABC", pal.labelInk));
+  add("label_to_symbols", label(pal, 256, 128, 0.9f, "?123", pal.labelInk));
+  add("label_done", label(pal, 128, 64, 1.01f, "Done", pal.onAccent));
+  add("label_done_held", label(pal, 128, 64, 1.01f, "Done", pal.accentInk));
+  add("label_to_pad", label(pal, 256, 128, 0.9f, "123", pal.labelInk));
+  add("key_pad", padFace(pal, charKey(pal)));
+  add("key_pad_alt", padFace(pal, functionKey(pal)));
+  add("key_pad_done", padDoneFace(pal, 128, accentKey(pal)));
+  add("key_pad_done_held", padDoneFace(pal, 256, functionKeyHeld(pal)));
+  add("label_pad_clear", label(pal, 128, 64, 0.95f, "Clear", pal.labelInk));
+  add("label_pad_ok", label(pal, 128, 64, 0.95f, "OK", pal.accentInk));
+  add("icon_pad_done", padDoneIcon(pal));
 }
 
 }  // namespace
@@ -538,8 +544,7 @@ int main(int argc, char** argv) {
     return 2;
   }
   try {
-    applyTheme(readTheme(argv[1]));
-    drawEverything();
+    drawEverything(paletteOf(readTheme(argv[1])));
     writeOutputs(argv[2]);
     if (argc > 3) writeContactSheet(argv[3]);
   } catch (const std::exception& e) {

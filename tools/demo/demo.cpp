@@ -88,9 +88,9 @@ struct Screen {
     topPop.makeCurrent();
     popTopDrawFrame(s);
     demo::Canvas canvas(kKeyboardWidth, kKeyboardHeight + kPopHeight, 0x20242AFF);
-    canvas.paste(fieldPop.read(), kKeyboardWidth, kPopHeight, 0, 0);
-    canvas.paste(topPop.read(), kKeyboardWidth, kPopHeight, 0, 0);
-    canvas.paste(keyboard.read(), kKeyboardWidth, kKeyboardHeight, 0, kPopHeight);
+    canvas.paste(demo::readSurface(fieldPop), kKeyboardWidth, kPopHeight, 0, 0);
+    canvas.paste(demo::readSurface(topPop), kKeyboardWidth, kPopHeight, 0, 0);
+    canvas.paste(demo::readSurface(keyboard), kKeyboardWidth, kKeyboardHeight, 0, kPopHeight);
     char name[64];
     std::snprintf(name, sizeof name, "/frame_%02d.png", frame++);
     const std::string path = outDir + name;

@@ -1,37 +1,23 @@
 // Offscreen surfaces for the demo: one EGL context + pbuffer per GL surface the app would own
-// (keyboard, field pop-up, top pop-up), on Mesa's surfaceless platform, plus PNG output.
+// (keyboard, field pop-up, top pop-up), on Mesa's surfaceless platform (tools/common), a canvas
+// they are pasted onto, and its PNG output.
 #pragma once
-
-#include <EGL/egl.h>
 
 #include <cstdint>
 #include <string>
 #include <vector>
 
+#include "common/egl_pbuffer.h"
+
 namespace demo {
 
-class OffscreenSurface {
- public:
-  OffscreenSurface(int width, int height);
-  ~OffscreenSurface();
-  OffscreenSurface(const OffscreenSurface&) = delete;
-  OffscreenSurface& operator=(const OffscreenSurface&) = delete;
+using OffscreenSurface = tessel::host::GlesContext;
 
-  bool ok() const { return error_.empty(); }
-  const std::string& error() const { return error_; }
-  int width() const { return width_; }
-  int height() const { return height_; }
-  bool makeCurrent();
-  // The colour buffer, RGBA8, top row first.
-  std::vector<std::uint8_t> read();
-
- private:
-  int width_, height_;
-  EGLDisplay display_ = EGL_NO_DISPLAY;
-  EGLSurface surface_ = EGL_NO_SURFACE;
-  EGLContext context_ = EGL_NO_CONTEXT;
-  std::string error_;
-};
+// The surface's colour buffer, RGBA8, top row first (made current first).
+inline std::vector<std::uint8_t> readSurface(OffscreenSurface& surface) {
+  surface.makeCurrent();
+  return surface.readRgba();
+}
 
 // An RGBA canvas that the three surfaces are pasted onto, as an app would lay them out.
 struct Canvas {

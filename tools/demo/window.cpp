@@ -294,13 +294,8 @@ void drawFrame(const KeyboardSession& s, const WindowState& w, KeyOverlay& overl
 
 // The back buffer as drawn (before the swap), written as an opaque PNG.
 bool writeScreenshot(const std::string& path, int width, int height) {
-  const std::size_t row = static_cast<std::size_t>(width) * 4;
-  std::vector<std::uint8_t> bottomUp(row * height);
-  glPixelStorei(GL_PACK_ALIGNMENT, 1);
-  glReadPixels(0, 0, width, height, GL_RGBA, GL_UNSIGNED_BYTE, bottomUp.data());
   Canvas canvas(width, height, kBackdrop);
-  for (int y = 0; y < height; ++y)
-    std::copy_n(&bottomUp[row * (height - 1 - y)], row, &canvas.rgba[row * y]);
+  canvas.rgba = tessel::host::readFramebuffer(width, height);
   for (std::size_t k = 3; k < canvas.rgba.size(); k += 4) canvas.rgba[k] = 255;
   return writePng(path, canvas);
 }

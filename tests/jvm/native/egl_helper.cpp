@@ -3,7 +3,7 @@
 // thread runs them, and the frame can be read back into Java.
 //
 // com.qn.tessel.test.EglContext calls these on its GL thread: create() makes the same Mesa
-// surfaceless context and pbuffer the C++ suites use (tests/support/egl_context.h) current on
+// surfaceless context and pbuffer the C++ suites use (tools/common/egl_pbuffer.h) current on
 // the calling thread, or returns 0 with the reason in lastError(); readPixels() returns the RGBA
 // bytes of the pbuffer, top row first (null on failure); release() destroys it.
 #include <jni.h>
@@ -13,9 +13,9 @@
 #include <string>
 #include <vector>
 
-#include "../../support/egl_context.h"
+#include "common/egl_pbuffer.h"
 
-using tessel::test::GlesContext;
+using tessel::host::GlesContext;
 
 static thread_local std::string g_error;
 

@@ -85,11 +85,17 @@ public final class QNKbdJniLib {
   /** Name given to {@code System.loadLibrary}. */
   public static final String LIBRARY_NAME = "TesselVIP";
 
-  /** What {@link #getNativeVersion} returns. */
-  public static final long VERSION = 3070005L;
-
-  /** What {@link #getNativeStringVersion} returns. */
+  /**
+   * What {@link #getNativeStringVersion} returns. The one place the version is written: the
+   * build gives the native library the same text and its number.
+   */
   public static final String VERSION_TEXT = "3.7.0.5";
+
+  /**
+   * What {@link #getNativeVersion} returns: {@link #VERSION_TEXT} "a.b.c.d" as
+   * a &times; 1000000 + b &times; 10000 + c &times; 100 + d.
+   */
+  public static final long VERSION = versionNumber(VERSION_TEXT);
 
   /** Number of session slots; handles are 0 .. {@code SESSION_SLOTS - 1}. */
   public static final int SESSION_SLOTS = 20;
@@ -106,8 +112,14 @@ public final class QNKbdJniLib {
   /** Keyboard styles of {@link #setNativeKbdStyle}. */
   public static final short STYLE_LOWER = 0, STYLE_UPPER = 1, STYLE_SYMBOLS = 2, STYLE_SYMBOLS_2 = 3;
 
-  /** Strength letters of {@link #getNativeDegree}. */
-  public static final char DEGREE_EMPTY = 'E', DEGREE_WEAK = 'W', DEGREE_MEDIUM = 'M', DEGREE_STRONG = 'S';
+  /**
+   * Strength letters. {@link #getNativeDegree} answers E, W, M or S; the strict numeric rating of
+   * encryption type 34 adds T (too short, or a trivial digit sequence) and R (digits dominated by
+   * one repeated digit or a long run), which appear only as the strength letter inside that
+   * type's output.
+   */
+  public static final char DEGREE_EMPTY = 'E', DEGREE_WEAK = 'W', DEGREE_MEDIUM = 'M', DEGREE_STRONG = 'S',
+      DEGREE_TRIVIAL = 'T', DEGREE_REPETITIVE = 'R';
 
   /** Results of {@link #getNativeVerify}. */
   public static final int VERIFY_OK = 0, VERIFY_EMPTY = -1, VERIFY_TOO_SHORT = -2, VERIFY_PATTERN = -3,
@@ -134,6 +146,14 @@ public final class QNKbdJniLib {
   }
 
   private QNKbdJniLib() {}
+
+  private static long versionNumber(String text) {
+    long number = 0;
+    for (String part : text.split("\\.")) {
+      number = number * 100 + Long.parseLong(part);
+    }
+    return number;
+  }
 
   /**
    * Whether the native methods can be called: true when the library was loaded by this class or
@@ -293,10 +313,10 @@ public final class QNKbdJniLib {
    */
   public static native int getNativeVerify(int handle);
 
-  /** @return 3070005 for any handle &ge; 0; -1 for a negative handle */
+  /** @return {@link #VERSION} for any handle &ge; 0; -1 for a negative handle */
   public static native long getNativeVersion(int handle);
 
-  /** @return "3.7.0.5" for any handle &ge; 0; null for a negative handle */
+  /** @return {@link #VERSION_TEXT} for any handle &ge; 0; null for a negative handle */
   public static native String getNativeStringVersion(int handle);
 
   /**

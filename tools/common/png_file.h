@@ -1,5 +1,7 @@
 // RGBA8 pixels (top row first) to and from PNG files through libpng's simplified API, for the
-// render suites' reviewed pictures. Every call refuses when the tests are built without libpng.
+// host-side programs (the render suites' reviewed pictures, the demo's frames, the artwork's
+// contact sheets; the library never links libpng). Header-only: a program that links libpng
+// defines TESSEL_HAVE_PNG; without it every call refuses.
 #pragma once
 
 #include <cstdint>
@@ -9,7 +11,8 @@
 #if defined(TESSEL_HAVE_PNG)
 #include <png.h>
 #endif
-namespace tessel::test {
+
+namespace tessel::host {
 
 #if defined(TESSEL_HAVE_PNG)
 inline bool writePng(const std::string& path, int width, int height, const std::vector<std::uint8_t>& rgba) {
@@ -36,4 +39,4 @@ inline bool writePng(const std::string&, int, int, const std::vector<std::uint8_
 inline bool readPng(const std::string&, int&, int&, std::vector<std::uint8_t>&) { return false; }
 #endif
 
-}  // namespace tessel::test
+}  // namespace tessel::host

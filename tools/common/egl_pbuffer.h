@@ -1,7 +1,8 @@
-// An offscreen OpenGL ES 1.1 context for tests and benchmarks (header-only): Mesa's surfaceless
-// EGL platform with a pbuffer, so the library's GL calls run on a real driver (llvmpipe) without
-// a window system. One EGLDisplay per process; each GlesContext owns its context and pbuffer,
-// like each of the app's GL surfaces (texture names are per context).
+// An offscreen OpenGL ES 1.1 context for the tests, the benchmarks and the demo (header-only, host
+// side; the library never links EGL): Mesa's surfaceless EGL platform with a pbuffer, so the
+// library's GL calls run on a real driver (llvmpipe) without a window system. One EGLDisplay per
+// process; each GlesContext owns its context and pbuffer, like each of the app's GL surfaces
+// (texture names are per context).
 #pragma once
 
 #include <EGL/egl.h>
@@ -13,7 +14,18 @@
 #include <string>
 #include <vector>
 
-namespace tessel::test {
+namespace tessel::host {
+
+// The current context's colour buffer, width x height from the bottom-left corner, as RGBA8 with
+// the top row first (glReadPixels delivers the bottom row first).
+inline std::vector<std::uint8_t> readFramebuffer(int width, int height) {
+  const std::size_t row = static_cast<std::size_t>(width) * 4;
+  std::vector<std::uint8_t> bottomUp(row * height), out(row * height);
+  glPixelStorei(GL_PACK_ALIGNMENT, 1);
+  glReadPixels(0, 0, width, height, GL_RGBA, GL_UNSIGNED_BYTE, bottomUp.data());
+  for (int y = 0; y < height; ++y) std::memcpy(&out[row * y], &bottomUp[row * (height - 1 - y)], row);
+  return out;
+}
 
 class GlesContext {
  public:
@@ -24,7 +36,7 @@ class GlesContext {
     }();
     display_ = shared;
     if (display_ == EGL_NO_DISPLAY) {
-      error_ = "surfaceless EGL display unavailable";
+      error_ = "no EGL surfaceless display (is Mesa's libegl-mesa0 installed?)";
       return;
     }
     const EGLint configAttributes[] = {EGL_SURFACE_TYPE, EGL_PBUFFER_BIT, EGL_RENDERABLE_TYPE, EGL_OPENGL_ES_BIT,
@@ -60,15 +72,8 @@ class GlesContext {
   int height() const { return height_; }
   bool makeCurrent() { return eglMakeCurrent(display_, surface_, surface_, context_) == EGL_TRUE; }
 
-  // The colour buffer as RGBA8, top row first (glReadPixels delivers the bottom row first).
-  std::vector<std::uint8_t> readRgba() const {
-    const std::size_t row = static_cast<std::size_t>(width_) * 4;
-    std::vector<std::uint8_t> bottomUp(row * height_), out(row * height_);
-    glPixelStorei(GL_PACK_ALIGNMENT, 1);
-    glReadPixels(0, 0, width_, height_, GL_RGBA, GL_UNSIGNED_BYTE, bottomUp.data());
-    for (int y = 0; y < height_; ++y) std::memcpy(&out[row * y], &bottomUp[row * (height_ - 1 - y)], row);
-    return out;
-  }
+  // The colour buffer as RGBA8, top row first.
+  std::vector<std::uint8_t> readRgba() const { return readFramebuffer(width_, height_); }
 
  private:
   int width_, height_;
@@ -78,4 +83,4 @@ class GlesContext {
   EGLContext context_ = EGL_NO_CONTEXT;
 };
 
-}  // namespace tessel::test
+}  // namespace tessel::host
