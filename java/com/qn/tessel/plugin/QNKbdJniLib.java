@@ -86,16 +86,19 @@ public final class QNKbdJniLib {
   public static final String LIBRARY_NAME = "TesselVIP";
 
   /**
-   * What {@link #getNativeStringVersion} returns. The one place the version is written: the
-   * build gives the native library the same text and its number.
+   * The version's four parts: the one place it is written. The build reads this line and gives
+   * the native library the same text and number; both constants below stay compile-time
+   * constants.
    */
-  public static final String VERSION_TEXT = "3.7.0.5";
+  private static final int VERSION_MAJOR = 3, VERSION_MINOR = 7, VERSION_PATCH = 0, VERSION_TWEAK = 5;
 
-  /**
-   * What {@link #getNativeVersion} returns: {@link #VERSION_TEXT} "a.b.c.d" as
-   * a &times; 1000000 + b &times; 10000 + c &times; 100 + d.
-   */
-  public static final long VERSION = versionNumber(VERSION_TEXT);
+  /** What {@link #getNativeStringVersion} returns: "a.b.c.d". */
+  public static final String VERSION_TEXT =
+      VERSION_MAJOR + "." + VERSION_MINOR + "." + VERSION_PATCH + "." + VERSION_TWEAK;
+
+  /** What {@link #getNativeVersion} returns: a &times; 1000000 + b &times; 10000 + c &times; 100 + d. */
+  public static final long VERSION =
+      VERSION_MAJOR * 1000000L + VERSION_MINOR * 10000 + VERSION_PATCH * 100 + VERSION_TWEAK;
 
   /** Number of session slots; handles are 0 .. {@code SESSION_SLOTS - 1}. */
   public static final int SESSION_SLOTS = 20;
@@ -146,14 +149,6 @@ public final class QNKbdJniLib {
   }
 
   private QNKbdJniLib() {}
-
-  private static long versionNumber(String text) {
-    long number = 0;
-    for (String part : text.split("\\.")) {
-      number = number * 100 + Long.parseLong(part);
-    }
-    return number;
-  }
 
   /**
    * Whether the native methods can be called: true when the library was loaded by this class or
