@@ -3,6 +3,7 @@
 #include "window.h"
 
 #define GLFW_INCLUDE_NONE
+#include <EGL/egl.h>
 #include <GLES/gl.h>
 #include <GLES/glext.h>
 #include <GLFW/glfw3.h>
@@ -221,9 +222,11 @@ void deleteNames(const TextureName (&names)[N]) {
 void deleteNames(const TextureName& name) { deleteNames(&name, 1); }
 
 // An app's surfaces lose their GL context with the keyboard, and their textures with it; the
-// demo keeps one context, so it deletes the three sets' textures before the surfaces are
-// created again.
+// demo keeps one context, so the three sets' textures must go before the surfaces are created
+// again. In an EGL context the library deletes them itself; under GLX it cannot tell the
+// context apart, so the demo does.
 void deleteSurfaceTextures(const KeyboardSession& s) {
+  if (eglGetCurrentContext() != EGL_NO_CONTEXT) return;
   const MainTextureSet& m = s.mainTextures;
   deleteNames(m.backgroundTexture);
   deleteNames(m.charKeyTextures);
@@ -243,7 +246,7 @@ void deleteSurfaceTextures(const KeyboardSession& s) {
   deleteNames(m.padLabelTextures);
   deleteNames(m.padDoneIconTexture);
   deleteNames(m.padDigitTextures);
-  const PopTextureSet& p = popTextures();
+  const PopTextureSet& p = s.popTextures;
   for (const TextureName* name : {&p.background, &p.frame, &p.dot, &p.cursor, &p.balloon}) deleteNames(*name);
   const PopTopTextureSet& t = s.popTopTextures;
   deleteNames(t.letters);
