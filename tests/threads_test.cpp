@@ -28,6 +28,10 @@
 
 #define JNI(method) Java_com_qn_tessel_plugin_QNKbdJniLib_##method
 
+namespace tessel {
+extern std::int32_t (*cursorClockMicros)();
+}
+
 namespace tessel::test {
 namespace {
 
@@ -306,6 +310,48 @@ TEST_F(AnyThread, TwoKeyboardsInOneContextDrawTheirOwnLayout) {
   createSurfaces(b);
   ASSERT_NE(frameOf(b), alone) << "keyboard b is not shuffled";
   EXPECT_EQ(frameOf(a), alone) << "keyboard a shows keyboard b's keys";
+}
+
+// Texture names alive in the current context.
+int liveTextures() {
+  int n = 0;
+  for (GLuint name = 1; name < 2048; ++name) n += glIsTexture(name) == GL_TRUE;
+  return n;
+}
+
+// Surfaces made again in the context that made them replace their textures rather than add to
+// them; made in another context, they leave their old names alone (there those numbers are
+// another keyboard's). Each keyboard's field pop-up draws from its own set.
+TEST_F(AnyThread, TexturesAreRenewedOnlyInTheContextThatMadeThem) {
+  const auto clock = cursorClockMicros;
+  cursorClockMicros = [] {  // 1 µs per frame: the cursor keeps its phase
+    static std::int32_t micros = 0;
+    return ++micros;
+  };
+  GlesContext x(kWidth, kHeight), y(kWidth, kHeight);
+  ASSERT_TRUE(x.ok() && y.ok()) << x.error() << y.error();
+  const int a = openKeyboard("keyboard-a"), b = openKeyboard("keyboard-b");
+  auto field = [&](GlesContext& gl, int h) {
+    gl.makeCurrent();
+    JNI(setNativePopSurfaceChanged)(env(), nullptr, h, kWidth, kHeight);
+    JNI(setNativePopDrawFrame)(env(), nullptr, h, JNI_TRUE);
+    return gl.readRgba();
+  };
+  x.makeCurrent();
+  createSurfaces(a);
+  const int once = liveTextures();
+  for (int k = 0; k < 3; ++k) createSurfaces(a);
+  EXPECT_EQ(liveTextures(), once) << "made again, the surfaces keep their old textures too";
+  const std::vector<std::uint8_t> fieldA = field(x, a);
+  y.makeCurrent();  // b's field pop-up first: its names here are the numbers of a's keyboard in x
+  JNI(setNativePopSurfaceCreated)(env(), nullptr, b);
+  JNI(setNativePopTopSurfaceCreated)(env(), nullptr, b);
+  const std::vector<std::uint8_t> fieldB = field(y, b);
+  EXPECT_EQ(field(x, a), fieldA) << "keyboard a's field pop-up draws with keyboard b's names";
+  y.makeCurrent();
+  createSurfaces(a);
+  EXPECT_EQ(field(y, b), fieldB) << "keyboard a deleted its names of context x in context y";
+  cursorClockMicros = clock;
 }
 
 }  // namespace
