@@ -352,6 +352,15 @@ TEST_F(AnyThread, TexturesAreRenewedOnlyInTheContextThatMadeThem) {
   for (int k = 0; k < 3; ++k) createSurfaces(a);
   EXPECT_EQ(liveTextures(), once) << "made again, the surfaces keep their old textures too";
   EXPECT_EQ(field(y, b), fieldB);
+  // A new context may get a destroyed one's handle back, and there a set's old numbers may be
+  // another set's textures: b's field pop-up set, stamped with y, holding a's numbers.
+  PopTextureSet& stale = sessionAt(b)->popTextures;
+  const PopTextureSet& held = sessionAt(a)->popTextures;
+  stale.background = held.background, stale.frame = held.frame, stale.dot = held.dot;
+  stale.cursor = held.cursor, stale.balloon = held.balloon;
+  const std::vector<std::uint8_t> fieldAinY = field(y, a);
+  JNI(setNativePopSurfaceCreated)(env(), nullptr, b);
+  EXPECT_EQ(field(y, a), fieldAinY) << "a set deleted names that another set holds";
   cursorClockMicros = clock;
 }
 

@@ -5,6 +5,7 @@
 #include <EGL/egl.h>
 #include <GLES/gl.h>
 
+#include <algorithm>
 #include <cstddef>
 
 #include "render/glyph_index.h"
@@ -16,24 +17,63 @@ namespace {
 
 constexpr int kMaxEntry = 26;
 
-// Starts the upload of a set in the current context: true when its old names were made in this
-// same context, so that each entry deletes them before generating its new ones.
-bool renewIn(GlContextTag& madeIn) noexcept {
-  const void* current = eglGetCurrentContext();
-  const bool same = current != EGL_NO_CONTEXT && madeIn.load() == current;
-  madeIn = current;
-  return same;
+constexpr std::size_t kNamesPerKeyboard = 164 + 5 + 30;  // the three upload lists
+
+// The names that the other sets of every live keyboard made in one context hold, sorted. An app
+// that destroys a context and makes a new one may get the old EGLContext handle back; there a
+// set's old numbers can already be another set's textures, and those are never deleted.
+struct HeldNames {
+  GLuint names[kSessionSlots * kNamesPerKeyboard];
+  std::size_t count = 0;
+  bool complete = true;
+  bool holds(GLuint name) const noexcept { return std::binary_search(names, names + count, name); }
+};
+
+template <typename Set>
+void addHeld(const Set& set, const void* self, const void* context, HeldNames& held) noexcept {
+  if (static_cast<const void*>(&set) == self || set.madeIn.load() != context) return;
+  forEachEntry(set, [&](const TextureName* names, int n) {
+    for (int i = 0; i < n; ++i) {
+      if (held.count == sizeof held.names / sizeof held.names[0]) {
+        held.complete = false;
+        return;
+      }
+      held.names[held.count++] = names[i];
+    }
+  });
 }
 
-// One upload-list entry: fresh names for `count` textures, stored into `out`, then filled; the
-// names `out` held before are deleted first when `dropOld`. `imageAt(i)` gives the image of
-// texture i, or null to leave it empty.
+// Starts the upload of `set` in the current context. When its old names were made in this same
+// context, returns the names that each entry must keep while it deletes the old ones before
+// generating new ones; null when nothing is to be deleted.
+template <typename Set>
+const HeldNames* renew(Set& set, HeldNames& held) noexcept {
+  const void* current = eglGetCurrentContext();
+  const bool same = current != EGL_NO_CONTEXT && set.madeIn.load() == current;
+  set.madeIn = current;
+  if (!same) return nullptr;
+  for (int handle = 0; handle < kSessionSlots; ++handle) {
+    const SessionRef other(handle);
+    if (!other) continue;
+    addHeld(other->mainTextures, &set, current, held);
+    addHeld(other->popTextures, &set, current, held);
+    addHeld(other->popTopTextures, &set, current, held);
+  }
+  std::sort(held.names, held.names + held.count);
+  return held.complete ? &held : nullptr;
+}
+
+// One upload-list entry: fresh names for `count` textures, stored into `out`, then filled. With
+// `keep`, the names `out` held before are deleted first, except those that `keep` holds.
+// `imageAt(i)` gives the image of texture i, or null to leave it empty.
 template <typename ImageAt>
-void uploadEntry(bool dropOld, TextureName* out, int count, ImageAt imageAt) noexcept {
+void uploadEntry(const HeldNames* keep, TextureName* out, int count, ImageAt imageAt) noexcept {
   GLuint names[kMaxEntry] = {};
-  if (dropOld) {
-    for (int i = 0; i < count; ++i) names[i] = out[i];
-    glDeleteTextures(count, names);
+  if (keep != nullptr) {
+    int old = 0;
+    for (int i = 0; i < count; ++i)
+      if (!keep->holds(out[i])) names[old++] = out[i];
+    glDeleteTextures(old, names);
   }
   glGenTextures(count, names);
   for (int i = 0; i < count; ++i) out[i] = names[i];
@@ -41,13 +81,13 @@ void uploadEntry(bool dropOld, TextureName* out, int count, ImageAt imageAt) noe
     if (const TextureImage* image = imageAt(i)) uploadTexture(names[i], *image);
 }
 
-void uploadGroup(bool dropOld, TextureName* out, const ImageGroup& group) noexcept {
-  uploadEntry(dropOld, out, group.count, [&](int i) { return &group[i]; });
+void uploadGroup(const HeldNames* keep, TextureName* out, const ImageGroup& group) noexcept {
+  uploadEntry(keep, out, group.count, [&](int i) { return &group[i]; });
 }
 
-void uploadPlain(bool dropOld, TextureName& out, const std::uint8_t* pixels) noexcept {
+void uploadPlain(const HeldNames* keep, TextureName& out, const std::uint8_t* pixels) noexcept {
   const TextureImage image{0, images::kPlainImageSize, images::kPlainImageSize, pixels, 0};
-  uploadEntry(dropOld, &out, 1, [&](int) { return &image; });
+  uploadEntry(keep, &out, 1, [&](int) { return &image; });
 }
 
 // The glyph image of a stored layout byte, unmasked only here; null when the character is not
@@ -64,9 +104,9 @@ const TextureImage* padGlyphFor(std::uint8_t stored, std::uint8_t mask) noexcept
 }
 
 template <std::size_t N>
-void uploadPositional(bool dropOld, TextureName* out, int count, const ImageGroup& group,
+void uploadPositional(const HeldNames* keep, TextureName* out, int count, const ImageGroup& group,
                       const RelaxedField<std::uint8_t> (&layout)[N], std::uint8_t mask) noexcept {
-  uploadEntry(dropOld, out, count, [&](int i) { return glyphFor(group, layout[i], mask); });
+  uploadEntry(keep, out, count, [&](int i) { return glyphFor(group, layout[i], mask); });
 }
 
 }  // namespace
@@ -83,45 +123,48 @@ void uploadTexture(std::uint32_t name, const TextureImage& image) noexcept {
 
 void uploadMainTextures(KeyboardSession& s) noexcept {
   MainTextureSet& t = s.mainTextures;
-  const bool renew = renewIn(t.madeIn);
+  HeldNames held;
+  const HeldNames* keep = renew(t, held);
   const std::uint8_t mask = s.keyMask;
-  uploadPlain(renew, t.backgroundTexture, images::kBackgroundPixels);
-  uploadGroup(renew, t.charKeyTextures, images::kCharKeys);
-  uploadPositional(renew, t.letterTextures, 26, images::kLetterGlyphs, s.letters, mask);
-  uploadPositional(renew, t.letterShiftTextures, 26, images::kShiftedLetterGlyphs, s.letters, mask);
-  uploadPositional(renew, t.symbolTextures, 26, images::kSymbolGlyphs, s.symbolsLower, mask);
-  uploadPositional(renew, t.symbolShiftTextures, 26, images::kSymbolShiftGlyphs, s.symbolsUpper, mask);
-  uploadGroup(renew, t.spaceKeyTextures, images::kSpaceKeys);
-  uploadGroup(renew, &t.spaceLabelTexture, images::kSpaceLabel);
-  uploadGroup(renew, t.shiftDeleteKeyTextures, images::kShiftDeleteKeys);
-  uploadGroup(renew, t.switchKeyTextures, images::kSwitchKeys);
-  uploadGroup(renew, t.doneKeyTextures, images::kDoneKeys);
-  uploadGroup(renew, t.iconTextures, images::kIcons);
-  uploadGroup(renew, t.labelTextures, images::kLabels);
-  uploadGroup(renew, t.padKeyTextures, images::kPadKeys);
-  uploadGroup(renew, t.padDoneKeyTextures, images::kPadDoneKeys);
-  uploadGroup(renew, t.padLabelTextures, images::kPadLabels);
-  uploadGroup(renew, &t.padDoneIconTexture, images::kPadDoneIcon);
-  uploadEntry(renew, t.padDigitTextures, 10, [&](int i) { return padGlyphFor(s.padDigits[i], mask); });
+  uploadPlain(keep, t.backgroundTexture, images::kBackgroundPixels);
+  uploadGroup(keep, t.charKeyTextures, images::kCharKeys);
+  uploadPositional(keep, t.letterTextures, 26, images::kLetterGlyphs, s.letters, mask);
+  uploadPositional(keep, t.letterShiftTextures, 26, images::kShiftedLetterGlyphs, s.letters, mask);
+  uploadPositional(keep, t.symbolTextures, 26, images::kSymbolGlyphs, s.symbolsLower, mask);
+  uploadPositional(keep, t.symbolShiftTextures, 26, images::kSymbolShiftGlyphs, s.symbolsUpper, mask);
+  uploadGroup(keep, t.spaceKeyTextures, images::kSpaceKeys);
+  uploadGroup(keep, &t.spaceLabelTexture, images::kSpaceLabel);
+  uploadGroup(keep, t.shiftDeleteKeyTextures, images::kShiftDeleteKeys);
+  uploadGroup(keep, t.switchKeyTextures, images::kSwitchKeys);
+  uploadGroup(keep, t.doneKeyTextures, images::kDoneKeys);
+  uploadGroup(keep, t.iconTextures, images::kIcons);
+  uploadGroup(keep, t.labelTextures, images::kLabels);
+  uploadGroup(keep, t.padKeyTextures, images::kPadKeys);
+  uploadGroup(keep, t.padDoneKeyTextures, images::kPadDoneKeys);
+  uploadGroup(keep, t.padLabelTextures, images::kPadLabels);
+  uploadGroup(keep, &t.padDoneIconTexture, images::kPadDoneIcon);
+  uploadEntry(keep, t.padDigitTextures, 10, [&](int i) { return padGlyphFor(s.padDigits[i], mask); });
 }
 
 void uploadPopTextures(KeyboardSession& s) noexcept {
   PopTextureSet& t = s.popTextures;
-  const bool renew = renewIn(t.madeIn);
-  uploadPlain(renew, t.background, images::kBackgroundPixels);
-  uploadPlain(renew, t.frame, images::kFieldFramePixels);
-  uploadPlain(renew, t.dot, images::kMaskDotPixels);
-  uploadGroup(renew, &t.cursor, images::kCursor);
-  uploadEntry(renew, &t.balloon, 1, [](int) { return &images::kCharKeys[2]; });
+  HeldNames held;
+  const HeldNames* keep = renew(t, held);
+  uploadPlain(keep, t.background, images::kBackgroundPixels);
+  uploadPlain(keep, t.frame, images::kFieldFramePixels);
+  uploadPlain(keep, t.dot, images::kMaskDotPixels);
+  uploadGroup(keep, &t.cursor, images::kCursor);
+  uploadEntry(keep, &t.balloon, 1, [](int) { return &images::kCharKeys[2]; });
 }
 
 void uploadPopTopTextures(KeyboardSession& s) noexcept {
   PopTopTextureSet& t = s.popTopTextures;
-  const bool renew = renewIn(t.madeIn);
+  HeldNames held;
+  const HeldNames* keep = renew(t, held);
   const std::uint8_t mask = s.keyMask;
-  uploadPositional(renew, t.letters, 10, images::kLetterGlyphs, s.letters, mask);
-  uploadPositional(renew, t.shiftedLetters, 10, images::kShiftedLetterGlyphs, s.letters, mask);
-  uploadPositional(renew, t.symbols, 10, images::kSymbolGlyphs, s.symbolsLower, mask);
+  uploadPositional(keep, t.letters, 10, images::kLetterGlyphs, s.letters, mask);
+  uploadPositional(keep, t.shiftedLetters, 10, images::kShiftedLetterGlyphs, s.letters, mask);
+  uploadPositional(keep, t.symbols, 10, images::kSymbolGlyphs, s.symbolsLower, mask);
 }
 
 }  // namespace tessel

@@ -67,6 +67,43 @@ struct PopTopTextureSet {
   GlContextTag madeIn;
 };
 
+// Calls f(names, count) for each entry of a set's upload list, in upload order.
+template <typename F>
+void forEachEntry(const MainTextureSet& t, F f) {
+  f(&t.backgroundTexture, 1);
+  f(t.charKeyTextures, 3);
+  f(t.letterTextures, 26);
+  f(t.letterShiftTextures, 26);
+  f(t.symbolTextures, 26);
+  f(t.symbolShiftTextures, 26);
+  f(t.spaceKeyTextures, 2);
+  f(&t.spaceLabelTexture, 1);
+  f(t.shiftDeleteKeyTextures, 2);
+  f(t.switchKeyTextures, 2);
+  f(t.doneKeyTextures, 2);
+  f(t.iconTextures, 4);
+  f(t.labelTextures, 5);
+  f(t.padKeyTextures, 2);
+  f(t.padDoneKeyTextures, 2);
+  f(t.padLabelTextures, 4);
+  f(&t.padDoneIconTexture, 1);
+  f(t.padDigitTextures, 10);
+}
+template <typename F>
+void forEachEntry(const PopTextureSet& t, F f) {
+  f(&t.background, 1);
+  f(&t.frame, 1);
+  f(&t.dot, 1);
+  f(&t.cursor, 1);
+  f(&t.balloon, 1);
+}
+template <typename F>
+void forEachEntry(const PopTopTextureSet& t, F f) {
+  f(t.letters, 10);
+  f(t.shiftedLetters, 10);
+  f(t.symbols, 10);
+}
+
 // Binds `name` and fills it from the image: MIN_FILTER nearest, MAG_FILTER linear, both wraps
 // clamp-to-edge (set with glTexParameterf, in that order), texture environment replace, then
 // glTexImage2D RGBA/UNSIGNED_BYTE straight from the embedded pixels. No mipmaps: the nearest
