@@ -16,7 +16,6 @@ namespace tessel {
 namespace {
 
 constexpr int kMaxEntry = 26;
-
 constexpr std::size_t kNamesPerKeyboard = 164 + 5 + 30;  // the three upload lists
 
 // The names that the other sets of every live keyboard made in one context hold, sorted. An app
@@ -43,15 +42,16 @@ void addHeld(const Set& set, const void* self, const void* context, HeldNames& h
   });
 }
 
-// Starts the upload of `set` in the current context. When its old names were made in this same
-// context, returns the names that each entry must keep while it deletes the old ones before
-// generating new ones; null when nothing is to be deleted.
+// Starts the upload of `set` in the current context: when its old names were made in this same
+// context, deletes them (all at once, before any new name is generated), except those that
+// another live set holds here.
 template <typename Set>
-const HeldNames* renew(Set& set, HeldNames& held) noexcept {
+void renew(Set& set) noexcept {
   const void* current = eglGetCurrentContext();
   const bool same = current != EGL_NO_CONTEXT && set.madeIn.load() == current;
   set.madeIn = current;
-  if (!same) return nullptr;
+  if (!same) return;
+  HeldNames held;
   for (int handle = 0; handle < kSessionSlots; ++handle) {
     const SessionRef other(handle);
     if (!other) continue;
@@ -59,35 +59,35 @@ const HeldNames* renew(Set& set, HeldNames& held) noexcept {
     addHeld(other->popTextures, &set, current, held);
     addHeld(other->popTopTextures, &set, current, held);
   }
+  if (!held.complete) return;
   std::sort(held.names, held.names + held.count);
-  return held.complete ? &held : nullptr;
+  GLuint old[kNamesPerKeyboard];
+  GLsizei n = 0;
+  forEachEntry(set, [&](const TextureName* names, int count) {
+    for (int i = 0; i < count; ++i)
+      if (static_cast<std::size_t>(n) < kNamesPerKeyboard && !held.holds(names[i])) old[n++] = names[i];
+  });
+  glDeleteTextures(n, old);
 }
 
-// One upload-list entry: fresh names for `count` textures, stored into `out`, then filled. With
-// `keep`, the names `out` held before are deleted first, except those that `keep` holds.
+// One upload-list entry: fresh names for `count` textures, stored into `out`, then filled.
 // `imageAt(i)` gives the image of texture i, or null to leave it empty.
 template <typename ImageAt>
-void uploadEntry(const HeldNames* keep, TextureName* out, int count, ImageAt imageAt) noexcept {
+void uploadEntry(TextureName* out, int count, ImageAt imageAt) noexcept {
   GLuint names[kMaxEntry] = {};
-  if (keep != nullptr) {
-    int old = 0;
-    for (int i = 0; i < count; ++i)
-      if (!keep->holds(out[i])) names[old++] = out[i];
-    glDeleteTextures(old, names);
-  }
   glGenTextures(count, names);
   for (int i = 0; i < count; ++i) out[i] = names[i];
   for (int i = 0; i < count; ++i)
     if (const TextureImage* image = imageAt(i)) uploadTexture(names[i], *image);
 }
 
-void uploadGroup(const HeldNames* keep, TextureName* out, const ImageGroup& group) noexcept {
-  uploadEntry(keep, out, group.count, [&](int i) { return &group[i]; });
+void uploadGroup(TextureName* out, const ImageGroup& group) noexcept {
+  uploadEntry(out, group.count, [&](int i) { return &group[i]; });
 }
 
-void uploadPlain(const HeldNames* keep, TextureName& out, const std::uint8_t* pixels) noexcept {
+void uploadPlain(TextureName& out, const std::uint8_t* pixels) noexcept {
   const TextureImage image{0, images::kPlainImageSize, images::kPlainImageSize, pixels, 0};
-  uploadEntry(keep, &out, 1, [&](int) { return &image; });
+  uploadEntry(&out, 1, [&](int) { return &image; });
 }
 
 // The glyph image of a stored layout byte, unmasked only here; null when the character is not
@@ -104,9 +104,9 @@ const TextureImage* padGlyphFor(std::uint8_t stored, std::uint8_t mask) noexcept
 }
 
 template <std::size_t N>
-void uploadPositional(const HeldNames* keep, TextureName* out, int count, const ImageGroup& group,
+void uploadPositional(TextureName* out, int count, const ImageGroup& group,
                       const RelaxedField<std::uint8_t> (&layout)[N], std::uint8_t mask) noexcept {
-  uploadEntry(keep, out, count, [&](int i) { return glyphFor(group, layout[i], mask); });
+  uploadEntry(out, count, [&](int i) { return glyphFor(group, layout[i], mask); });
 }
 
 }  // namespace
@@ -123,48 +123,45 @@ void uploadTexture(std::uint32_t name, const TextureImage& image) noexcept {
 
 void uploadMainTextures(KeyboardSession& s) noexcept {
   MainTextureSet& t = s.mainTextures;
-  HeldNames held;
-  const HeldNames* keep = renew(t, held);
+  renew(t);
   const std::uint8_t mask = s.keyMask;
-  uploadPlain(keep, t.backgroundTexture, images::kBackgroundPixels);
-  uploadGroup(keep, t.charKeyTextures, images::kCharKeys);
-  uploadPositional(keep, t.letterTextures, 26, images::kLetterGlyphs, s.letters, mask);
-  uploadPositional(keep, t.letterShiftTextures, 26, images::kShiftedLetterGlyphs, s.letters, mask);
-  uploadPositional(keep, t.symbolTextures, 26, images::kSymbolGlyphs, s.symbolsLower, mask);
-  uploadPositional(keep, t.symbolShiftTextures, 26, images::kSymbolShiftGlyphs, s.symbolsUpper, mask);
-  uploadGroup(keep, t.spaceKeyTextures, images::kSpaceKeys);
-  uploadGroup(keep, &t.spaceLabelTexture, images::kSpaceLabel);
-  uploadGroup(keep, t.shiftDeleteKeyTextures, images::kShiftDeleteKeys);
-  uploadGroup(keep, t.switchKeyTextures, images::kSwitchKeys);
-  uploadGroup(keep, t.doneKeyTextures, images::kDoneKeys);
-  uploadGroup(keep, t.iconTextures, images::kIcons);
-  uploadGroup(keep, t.labelTextures, images::kLabels);
-  uploadGroup(keep, t.padKeyTextures, images::kPadKeys);
-  uploadGroup(keep, t.padDoneKeyTextures, images::kPadDoneKeys);
-  uploadGroup(keep, t.padLabelTextures, images::kPadLabels);
-  uploadGroup(keep, &t.padDoneIconTexture, images::kPadDoneIcon);
-  uploadEntry(keep, t.padDigitTextures, 10, [&](int i) { return padGlyphFor(s.padDigits[i], mask); });
+  uploadPlain(t.backgroundTexture, images::kBackgroundPixels);
+  uploadGroup(t.charKeyTextures, images::kCharKeys);
+  uploadPositional(t.letterTextures, 26, images::kLetterGlyphs, s.letters, mask);
+  uploadPositional(t.letterShiftTextures, 26, images::kShiftedLetterGlyphs, s.letters, mask);
+  uploadPositional(t.symbolTextures, 26, images::kSymbolGlyphs, s.symbolsLower, mask);
+  uploadPositional(t.symbolShiftTextures, 26, images::kSymbolShiftGlyphs, s.symbolsUpper, mask);
+  uploadGroup(t.spaceKeyTextures, images::kSpaceKeys);
+  uploadGroup(&t.spaceLabelTexture, images::kSpaceLabel);
+  uploadGroup(t.shiftDeleteKeyTextures, images::kShiftDeleteKeys);
+  uploadGroup(t.switchKeyTextures, images::kSwitchKeys);
+  uploadGroup(t.doneKeyTextures, images::kDoneKeys);
+  uploadGroup(t.iconTextures, images::kIcons);
+  uploadGroup(t.labelTextures, images::kLabels);
+  uploadGroup(t.padKeyTextures, images::kPadKeys);
+  uploadGroup(t.padDoneKeyTextures, images::kPadDoneKeys);
+  uploadGroup(t.padLabelTextures, images::kPadLabels);
+  uploadGroup(&t.padDoneIconTexture, images::kPadDoneIcon);
+  uploadEntry(t.padDigitTextures, 10, [&](int i) { return padGlyphFor(s.padDigits[i], mask); });
 }
 
 void uploadPopTextures(KeyboardSession& s) noexcept {
   PopTextureSet& t = s.popTextures;
-  HeldNames held;
-  const HeldNames* keep = renew(t, held);
-  uploadPlain(keep, t.background, images::kBackgroundPixels);
-  uploadPlain(keep, t.frame, images::kFieldFramePixels);
-  uploadPlain(keep, t.dot, images::kMaskDotPixels);
-  uploadGroup(keep, &t.cursor, images::kCursor);
-  uploadEntry(keep, &t.balloon, 1, [](int) { return &images::kCharKeys[2]; });
+  renew(t);
+  uploadPlain(t.background, images::kBackgroundPixels);
+  uploadPlain(t.frame, images::kFieldFramePixels);
+  uploadPlain(t.dot, images::kMaskDotPixels);
+  uploadGroup(&t.cursor, images::kCursor);
+  uploadEntry(&t.balloon, 1, [](int) { return &images::kCharKeys[2]; });
 }
 
 void uploadPopTopTextures(KeyboardSession& s) noexcept {
   PopTopTextureSet& t = s.popTopTextures;
-  HeldNames held;
-  const HeldNames* keep = renew(t, held);
+  renew(t);
   const std::uint8_t mask = s.keyMask;
-  uploadPositional(keep, t.letters, 10, images::kLetterGlyphs, s.letters, mask);
-  uploadPositional(keep, t.shiftedLetters, 10, images::kShiftedLetterGlyphs, s.letters, mask);
-  uploadPositional(keep, t.symbols, 10, images::kSymbolGlyphs, s.symbolsLower, mask);
+  uploadPositional(t.letters, 10, images::kLetterGlyphs, s.letters, mask);
+  uploadPositional(t.shiftedLetters, 10, images::kShiftedLetterGlyphs, s.letters, mask);
+  uploadPositional(t.symbols, 10, images::kSymbolGlyphs, s.symbolsLower, mask);
 }
 
 }  // namespace tessel

@@ -5,9 +5,9 @@
 // another. Every creation of a surface generates fresh names (one glGenTextures per entry of
 // the upload list, before the entry's textures are filled) and overwrites its set. A set
 // remembers the GL context its names were made in (eglGetCurrentContext()): when it is made
-// again in that same context, each entry's old names are deleted just before its new ones are
-// generated, so an app that re-creates surfaces in a context it keeps (a reshuffle after done)
-// does not pile up textures. Old names made in another context, or with none current, are
+// again in that same context, its old names are deleted before the new ones are generated, so
+// an app that re-creates surfaces in a context it keeps (a reshuffle after done) does not pile
+// up textures. Old names made in another context, or with none current, are
 // never deleted: they go with their context, and here their numbers may be someone else's.
 // The names are stored as relaxed atomics: a frame may be drawing from a set on another GL
 // thread while it is replaced (never in the same context, where the deleting happens).
