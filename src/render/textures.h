@@ -7,8 +7,10 @@
 // remembers the GL context its names were made in (eglGetCurrentContext()): when it is made
 // again in that same context, its old names are deleted before the new ones are generated, so
 // an app that re-creates surfaces in a context it keeps (a reshuffle after done) does not pile
-// up textures. Old names made in another context, or with none current, are
-// never deleted: they go with their context, and here their numbers may be someone else's.
+// up textures. Old names made in another context, or with none current, are never deleted:
+// they go with their context, and here their numbers may be someone else's. Nor are names that
+// another keyboard's set made in the current context holds (a new context may get a destroyed
+// one's handle back).
 // The names are stored as relaxed atomics: a frame may be drawing from a set on another GL
 // thread while it is replaced (never in the same context, where the deleting happens).
 //
