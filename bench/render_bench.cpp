@@ -2,7 +2,8 @@
 // including glFinish, set against the library's own CPU time per frame. And start-up: for the
 // keyboard and both pop-ups, the time from surface created to the first drawn frame (layout
 // build, texture upload, geometry, one frame, glFinish) on a fresh context, with the library's
-// own CPU share of it and the pixel bytes it uploads.
+// own CPU share of it and the pixel bytes it uploads. And the memory that 300 re-creations of
+// the three surfaces in one context leave behind.
 //
 // To tell the library's cost apart from the driver's, this program interposes the GL entry
 // points a frame uses: the library (linked statically) calls these definitions, which count
@@ -18,6 +19,7 @@
 #include <GLES/gl.h>
 #include <dlfcn.h>
 #include <time.h>
+#include <unistd.h>
 
 #include <cstdio>
 #include <cstdlib>
@@ -80,6 +82,7 @@ TESSEL_FORWARD(glViewport, (GLint a, GLint b, GLsizei c, GLsizei d), (a, b, c, d
 TESSEL_FORWARD(glTexParameterf, (GLenum a, GLenum b, GLfloat c), (a, b, c))
 TESSEL_FORWARD(glTexEnvf, (GLenum a, GLenum b, GLfloat c), (a, b, c))
 TESSEL_FORWARD(glGenTextures, (GLsizei a, GLuint* b), (a, b))
+TESSEL_FORWARD(glDeleteTextures, (GLsizei a, const GLuint* b), (a, b))
 
 namespace {
 long long gUploadedBytes = 0;
@@ -236,6 +239,50 @@ void BM_StartUp(benchmark::State& state) {
   state.counters["upload_MB"] = static_cast<double>(bytes) / 1e6;
 }
 BENCHMARK(BM_StartUp)->DenseRange(0, 2)->ArgName("surface")->Unit(benchmark::kMillisecond)->Iterations(15);
+
+// The process's resident memory in MiB (llvmpipe keeps textures in it).
+double residentMiB() {
+  long pages = 0, resident = 0;
+  if (std::FILE* f = std::fopen("/proc/self/statm", "r")) {
+    if (std::fscanf(f, "%ld %ld", &pages, &resident) != 2) resident = 0;
+    std::fclose(f);
+  }
+  return static_cast<double>(resident) * static_cast<double>(sysconf(_SC_PAGESIZE)) / (1024.0 * 1024.0);
+}
+
+// An app that keeps one GL context and shows its keyboard again after each done (a reshuffle):
+// all three surfaces created, changed and drawn once per round, `rounds` rounds in one context.
+// Reports how much the resident memory grew from the end of the first round to the last.
+void BM_TextureGrowth(benchmark::State& state) {
+  tessel::test::GlesContext gl(1080, 720);
+  const int handle = tessel::createSession("bench-growth");
+  KeyboardSession* s = tessel::sessionAt(handle);
+  if (s == nullptr || !gl.ok()) {
+    state.SkipWithError(("no offscreen GLES 1.1: " + gl.error()).c_str());
+    return;
+  }
+  s->kbdRandom = 1;
+  gNullDriver = false;
+  auto round = [&] {
+    for (const SurfaceKind& kind : kSurfaces) startUp(kind, *s);
+    glFinish();
+  };
+  double growth = 0, wall = 0;
+  for (auto _ : state) {
+    round();
+    const double first = residentMiB();
+    timespec t0{}, t1{};
+    clock_gettime(CLOCK_MONOTONIC, &t0);
+    for (std::int64_t k = 1; k < state.range(0); ++k) round();
+    clock_gettime(CLOCK_MONOTONIC, &t1);
+    growth = residentMiB() - first;
+    wall = static_cast<double>(t1.tv_sec - t0.tv_sec) + (t1.tv_nsec - t0.tv_nsec) * 1e-9;
+  }
+  tessel::destroySession(handle);
+  state.counters["growth_MiB"] = growth;
+  state.counters["round_ms"] = wall * 1e3 / static_cast<double>(state.range(0) - 1);
+}
+BENCHMARK(BM_TextureGrowth)->Arg(300)->ArgName("rounds")->Unit(benchmark::kMillisecond)->Iterations(1)->UseRealTime();
 
 }  // namespace
 

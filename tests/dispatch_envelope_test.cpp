@@ -74,45 +74,46 @@ TEST_F(KnownRandom, EnvelopeMatchesOpenSslAssemblyForEachDrop) {
   EXPECT_EQ(opened, content);
 }
 
-// ---- the system source, its calls faked: each read gives at most the count its script names
-// (-1: fails with errno, 0: end of file), from the byte sequence 1, 2, 3, ...
-struct FakeOs {
-  int openResult = 7;
-  std::vector<int> reads;
-  std::vector<int> errnos;
-  std::size_t call = 0;
-  int closes = 0;
-  std::uint8_t next = 1;
-} gOs;
+// ---- the system source, its calls faked: each getrandom or read gives at most the count its
+// script names (-1: fails with the next errno, 0: end of file), from the byte sequence 1, 2, 3, ...
+struct Script { std::vector<int> results = {}, errnos = {}; std::size_t call = 0; };
+struct FakeOs { Script getrandom; int openResult = 7; Script reads; int opens = 0, closes = 0; std::uint8_t next = 1; } gOs;
+long play(Script& script, void* buffer, std::size_t n) {
+  if (script.call >= script.results.size()) return 0;
+  const int result = script.results[script.call];
+  errno = script.call < script.errnos.size() ? script.errnos[script.call] : EIO;
+  if (++script.call, result < 0) return -1;
+  const std::size_t k = std::min(n, static_cast<std::size_t>(result));
+  for (std::size_t i = 0; i < k; ++i) static_cast<std::uint8_t*>(buffer)[i] = gOs.next++;
+  return static_cast<long>(k);
+}
 const RandomSystemCalls kFakeCalls{
-    +[](const char* path, int) { return std::string(path) == "/dev/urandom" ? gOs.openResult : -1; },
-    +[](int fd, void* buffer, std::size_t n) -> ssize_t {
-      EXPECT_EQ(fd, gOs.openResult);
-      if (gOs.call >= gOs.reads.size()) return 0;
-      const int script = gOs.reads[gOs.call];
-      errno = gOs.call < gOs.errnos.size() ? gOs.errnos[gOs.call] : EIO;
-      ++gOs.call;
-      if (script < 0) return -1;
-      const std::size_t k = std::min(n, static_cast<std::size_t>(script));
-      for (std::size_t i = 0; i < k; ++i) static_cast<std::uint8_t*>(buffer)[i] = gOs.next++;
-      return static_cast<ssize_t>(k);
-    },
-    +[](int) { return ++gOs.closes, 0; }};
+    +[](const char* path, int) { return ++gOs.opens, std::string(path) == "/dev/urandom" ? gOs.openResult : -1; },
+    +[](int fd, void* buffer, std::size_t n) -> ssize_t { return fd == 7 ? play(gOs.reads, buffer, n) : -2; },
+    +[](int) { return ++gOs.closes, 0; },
+    +[](void* buffer, std::size_t n, unsigned flags) { return flags == 0 ? play(gOs.getrandom, buffer, n) : -2; }};
 
 TEST(RandomSource, SystemCallFailuresGiveError9AndNeverAPartKey) {
   Bytes counting(16);
   for (std::size_t i = 0; i < 16; ++i) counting[i] = static_cast<std::uint8_t>(i + 1);
+  const Script absent{{-1}, {ENOSYS}};
   const struct {
     const char* name;
+    Script getrandom;
     int open;
-    std::vector<int> reads, errnos;
+    Script reads;
     bool ok;
+    int opens;  // /dev/urandom is opened only when getrandom is absent or refused
   } cases[] = {
-      {"open fails", -1, {16}, {}, false},
-      {"read fails", 7, {-1}, {EIO}, false},
-      {"interrupted, then read", 7, {-1, 16}, {EINTR}, true},
-      {"short reads are completed", 7, {5, 5, 1, 100}, {}, true},
-      {"end of file before the request is full", 7, {5, 0}, {}, false},
+      {"getrandom", {{16}}, 7, {}, true, 0},
+      {"getrandom interrupted, short, then complete", {{-1, 5, 11}, {EINTR}}, 7, {}, true, 0},
+      {"getrandom fails otherwise: no fallback", {{5, -1}, {0, EFAULT}}, 7, {{16}}, false, 0},
+      {"getrandom refused by seccomp: /dev/urandom", {{-1}, {EPERM}}, 7, {{16}}, true, 1},
+      {"getrandom absent, open fails", absent, -1, {{16}}, false, 1},
+      {"getrandom absent, read fails", absent, 7, {{-1}, {EIO}}, false, 1},
+      {"getrandom absent, interrupted, then read", absent, 7, {{-1, 16}, {EINTR}}, true, 1},
+      {"getrandom absent, short reads are completed", absent, 7, {{5, 5, 1, 100}}, true, 1},
+      {"getrandom absent, end of file before the request is full", absent, 7, {{5, 0}}, false, 1},
   };
   const std::string modulus = appKey().modulusHex(), encModulus = encKey().modulusHex();
   const char* const keys[2] = {modulus.c_str(), encModulus.c_str()};
@@ -120,15 +121,16 @@ TEST(RandomSource, SystemCallFailuresGiveError9AndNeverAPartKey) {
   for (const auto& c : cases) {
     // randomBytes itself; on failure also the envelope key (type 0) and the triple-DES key (38).
     for (int type : c.ok ? std::vector<int>{-1} : std::vector<int>{-1, 0, 38}) {
-      gOs = FakeOs{c.open, c.reads, c.errnos};
+      gOs = FakeOs{c.getrandom, c.open, c.reads};
       Bytes key(16, 0xEE);
       SecureBuffer out;
       const int code = type < 0 ? (randomBytes(key.data(), key.size()) ? 0 : 9)
                                 : encryptionDispatch(type, keys, &out, "1234", "1700000000");
       EXPECT_EQ(code, c.ok ? 0 : 9) << c.name << ", type " << type;
       EXPECT_FALSE(out) << c.name;
-      if (type < 0 && c.ok) { EXPECT_EQ(key, counting) << c.name; }
-      EXPECT_EQ(gOs.closes, c.open < 0 ? 0 : 1) << c.name << ", type " << type;
+      if (type < 0) { EXPECT_EQ(key, c.ok ? counting : Bytes(16, 0)) << c.name; }
+      EXPECT_EQ(gOs.opens, c.opens) << c.name << ", type " << type;
+      EXPECT_EQ(gOs.closes, c.open < 0 ? 0 : c.opens) << c.name << ", type " << type;
     }
   }
   setRandomSystemCallsForTesting(nullptr);

@@ -28,6 +28,8 @@
 
 #define JNI(method) Java_com_qn_tessel_plugin_QNKbdJniLib_##method
 
+namespace tessel { extern std::int32_t (*cursorClockMicros)(); }
+
 namespace tessel::test {
 namespace {
 
@@ -291,22 +293,52 @@ TEST_F(AnyThread, TwoReadersAtOnceLoseNothing) {
   releaseOwnedText(sessionAt(h)->content->hashRandomSuffix);  // destroy keeps it by design
 }
 
-// Two keyboards whose surfaces share one GL context each show their own layout.
-TEST_F(AnyThread, TwoKeyboardsInOneContextDrawTheirOwnLayout) {
-  GlesContext gl(kWidth, kHeight);
-  ASSERT_TRUE(gl.ok()) << gl.error();
-  const int a = openKeyboard("keyboard-a");
-  const int b = openKeyboard("keyboard-b");
+// Texture sets belong to their keyboard and their context. In one context two keyboards each
+// draw their own layout, and surfaces made again replace their textures rather than add to them.
+// Made in another context, a keyboard's sets leave their old names alone (there the numbers are
+// another keyboard's), and never delete names another keyboard's set holds (a new context may get
+// a destroyed one's handle back). Each keyboard's field pop-up draws from its own set.
+TEST_F(AnyThread, TexturesBelongToTheirKeyboardAndContext) {
+  const auto clock = cursorClockMicros;
+  cursorClockMicros = [] { static std::int32_t micros = 0; return ++micros; };  // the cursor keeps its phase
+  GlesContext x(kWidth, kHeight), y(kWidth, kHeight);
+  ASSERT_TRUE(x.ok() && y.ok()) << x.error() << y.error();
+  const int a = openKeyboard("keyboard-a"), b = openKeyboard("keyboard-b");
   JNI(setNativeKbdRandom)(env(), nullptr, b, JNI_TRUE);
-  auto frameOf = [&](int h) {
-    JNI(setNativeDrawFrame)(env(), nullptr, h);
-    return gl.readRgba();
+  auto frame = [&](GlesContext& gl, int h) { return gl.makeCurrent(), JNI(setNativeDrawFrame)(env(), nullptr, h), gl.readRgba(); };
+  auto field = [&](GlesContext& gl, int h) {
+    gl.makeCurrent();
+    JNI(setNativePopSurfaceChanged)(env(), nullptr, h, kWidth, kHeight);
+    return JNI(setNativePopDrawFrame)(env(), nullptr, h, JNI_TRUE), gl.readRgba();
   };
+  auto live = [] { int n = 0; for (GLuint k = 1; k < 2048; ++k) n += glIsTexture(k); return n; };
+  x.makeCurrent();
   createSurfaces(a);
-  const std::vector<std::uint8_t> alone = frameOf(a);
+  const std::vector<std::uint8_t> fieldA = field(x, a);
+  y.makeCurrent();  // b's field pop-up first: its names here are the numbers of a's keyboard in x
+  JNI(setNativePopSurfaceCreated)(env(), nullptr, b);
+  JNI(setNativePopTopSurfaceCreated)(env(), nullptr, b);
+  EXPECT_EQ(field(x, a), fieldA) << "keyboard a's field pop-up draws with keyboard b's names";
+  y.makeCurrent();
+  GLuint own = 0;  // the app's own texture in y, numbered like one of a's in x
+  glGenTextures(1, &own), glBindTexture(GL_TEXTURE_2D, own);
+  createSurfaces(a);
+  EXPECT_TRUE(glIsTexture(own)) << "keyboard a deleted its names of context x in context y";
+  const int once = live();
+  for (int k = 0; k < 3; ++k) createSurfaces(a);
+  EXPECT_EQ(live(), once) << "made again, the surfaces keep their old textures too";
+  const std::vector<std::uint8_t> alone = frame(y, a);
   createSurfaces(b);
-  ASSERT_NE(frameOf(b), alone) << "keyboard b is not shuffled";
-  EXPECT_EQ(frameOf(a), alone) << "keyboard a shows keyboard b's keys";
+  ASSERT_NE(frame(y, b), alone) << "keyboard b is not shuffled";
+  EXPECT_EQ(frame(y, a), alone) << "keyboard a shows keyboard b's keys";
+  PopTextureSet& stale = sessionAt(b)->popTextures;  // stamped with y, holding a's numbers
+  const PopTextureSet& held = sessionAt(a)->popTextures;
+  stale.background = held.background, stale.frame = held.frame, stale.dot = held.dot;
+  stale.cursor = held.cursor, stale.balloon = held.balloon;
+  const std::vector<std::uint8_t> fieldAinY = field(y, a);
+  JNI(setNativePopSurfaceCreated)(env(), nullptr, b);
+  EXPECT_EQ(field(y, a), fieldAinY) << "a set deleted names that another set holds";
+  cursorClockMicros = clock;
 }
 
 }  // namespace

@@ -7,7 +7,6 @@
 // The lrand48 stream is not a cryptographic source: secrets come from randomBytes().
 #pragma once
 
-#include <cstddef>
 #include <cstdint>
 
 namespace tessel {
@@ -26,13 +25,9 @@ long rand48Next() noexcept;
 // Seeds as srand48(seed): high 32 bits of the state from seed, low 16 bits 0x330E.
 void rand48Seed(long seed) noexcept;
 
-// Fills buffer with n bytes from getrandom(2), or from /dev/urandom where the kernel lacks the
-// call. False only when neither source delivers all n bytes.
-bool osRandomBytes(void* buffer, std::size_t n) noexcept;
-
-// Uniform in [0, bound), bound >= 1, from osRandomBytes (rejection sampling, no modulo bias).
-// Should both OS sources fail, the draw comes from the lrand48 stream instead, so a sandbox
-// that hides them gets the ordinary shuffle rather than none.
+// Uniform in [0, bound), bound >= 1, from systemRandomBytes (crypto/random.h; rejection
+// sampling, no modulo bias). Should the system source fail, the draw comes from the lrand48
+// stream instead, so a sandbox that hides it gets the ordinary shuffle rather than none.
 std::uint32_t osRandomBelow(std::uint32_t bound) noexcept;
 
 // keyMask for a new session: lrand48() & 31 from the shared stream; in a strong-random build a

@@ -62,7 +62,7 @@ void aspect(const KeyboardSession& s) { render::aspect(s.surfaceMode == 1, s.key
 float topRowX(std::uint32_t column) { return 2.0f * static_cast<float>(column) - 9.0f; }
 
 void drawField(const KeyboardSession& s) {
-  const PopTextureSet& t = popTextures();
+  const PopTextureSet& t = s.popTextures;
   const bool pad = s.currentKbdType != 0;
   const bool mode1 = s.surfaceMode == 1;
 
@@ -107,9 +107,10 @@ void drawField(const KeyboardSession& s) {
 
 }  // namespace
 
-void popSurfaceCreated(KeyboardSession&) {
+void popSurfaceCreated(KeyboardSession& s) {
+  std::lock_guard<std::recursive_mutex> guard(s.lock);
   render::applySurfaceState();
-  uploadPopTextures();
+  uploadPopTextures(s);
 }
 
 void popSurfaceChanged(KeyboardSession&, int width, int height) {
@@ -119,7 +120,7 @@ void popSurfaceChanged(KeyboardSession&, int width, int height) {
 
 void popDrawFrame(const KeyboardSession& s, bool showField) {
   if (s.layoutBuilt != 1) return;
-  const PopTextureSet& t = popTextures();
+  const PopTextureSet& t = s.popTextures;
   render::clearFrame();
   if (showField) {
     render::drawBackground(t.background.load());

@@ -2,8 +2,10 @@
 // order per surface; the glyph entries follow the session's layout.
 #include "render/textures.h"
 
+#include <EGL/egl.h>
 #include <GLES/gl.h>
 
+#include <algorithm>
 #include <cstddef>
 
 #include "render/glyph_index.h"
@@ -13,9 +15,60 @@ namespace tessel {
 
 namespace {
 
-PopTextureSet gPop;
-
 constexpr int kMaxEntry = 26;
+constexpr std::size_t kNamesPerKeyboard = 164 + 5 + 30;  // the three upload lists
+
+// The names that the other sets of every live keyboard made in one context hold, sorted. An app
+// that destroys a context and makes a new one may get the old EGLContext handle back; there a
+// set's old numbers can already be another set's textures, and those are never deleted.
+struct HeldNames {
+  GLuint names[kSessionSlots * kNamesPerKeyboard];
+  std::size_t count = 0;
+  bool complete = true;
+  bool holds(GLuint name) const noexcept { return std::binary_search(names, names + count, name); }
+};
+
+template <typename Set>
+void addHeld(const Set& set, const void* self, const void* context, HeldNames& held) noexcept {
+  if (static_cast<const void*>(&set) == self || set.madeIn.load() != context) return;
+  forEachEntry(set, [&](const TextureName* names, int n) {
+    for (int i = 0; i < n; ++i) {
+      if (held.count == sizeof held.names / sizeof held.names[0]) {
+        held.complete = false;
+        return;
+      }
+      held.names[held.count++] = names[i];
+    }
+  });
+}
+
+// Starts the upload of `set` in the current context: when its old names were made in this same
+// context, deletes them (all at once, before any new name is generated), except those that
+// another live set holds here.
+template <typename Set>
+void renew(Set& set) noexcept {
+  const void* current = eglGetCurrentContext();
+  const bool same = current != EGL_NO_CONTEXT && set.madeIn.load() == current;
+  set.madeIn = current;
+  if (!same) return;
+  HeldNames held;
+  for (int handle = 0; handle < kSessionSlots; ++handle) {
+    const SessionRef other(handle);
+    if (!other) continue;
+    addHeld(other->mainTextures, &set, current, held);
+    addHeld(other->popTextures, &set, current, held);
+    addHeld(other->popTopTextures, &set, current, held);
+  }
+  if (!held.complete) return;
+  std::sort(held.names, held.names + held.count);
+  GLuint old[kNamesPerKeyboard];
+  GLsizei n = 0;
+  forEachEntry(set, [&](const TextureName* names, int count) {
+    for (int i = 0; i < count; ++i)
+      if (static_cast<std::size_t>(n) < kNamesPerKeyboard && !held.holds(names[i])) old[n++] = names[i];
+  });
+  glDeleteTextures(n, old);
+}
 
 // One upload-list entry: fresh names for `count` textures, stored into `out`, then filled.
 // `imageAt(i)` gives the image of texture i, or null to leave it empty.
@@ -58,8 +111,6 @@ void uploadPositional(TextureName* out, int count, const ImageGroup& group,
 
 }  // namespace
 
-PopTextureSet& popTextures() noexcept { return gPop; }
-
 void uploadTexture(std::uint32_t name, const TextureImage& image) noexcept {
   glBindTexture(GL_TEXTURE_2D, name);
   glTexParameterf(GL_TEXTURE_2D, GL_TEXTURE_MIN_FILTER, static_cast<GLfloat>(GL_NEAREST));
@@ -72,6 +123,7 @@ void uploadTexture(std::uint32_t name, const TextureImage& image) noexcept {
 
 void uploadMainTextures(KeyboardSession& s) noexcept {
   MainTextureSet& t = s.mainTextures;
+  renew(t);
   const std::uint8_t mask = s.keyMask;
   uploadPlain(t.backgroundTexture, images::kBackgroundPixels);
   uploadGroup(t.charKeyTextures, images::kCharKeys);
@@ -93,8 +145,9 @@ void uploadMainTextures(KeyboardSession& s) noexcept {
   uploadEntry(t.padDigitTextures, 10, [&](int i) { return padGlyphFor(s.padDigits[i], mask); });
 }
 
-void uploadPopTextures() noexcept {
-  PopTextureSet& t = gPop;
+void uploadPopTextures(KeyboardSession& s) noexcept {
+  PopTextureSet& t = s.popTextures;
+  renew(t);
   uploadPlain(t.background, images::kBackgroundPixels);
   uploadPlain(t.frame, images::kFieldFramePixels);
   uploadPlain(t.dot, images::kMaskDotPixels);
@@ -104,6 +157,7 @@ void uploadPopTextures() noexcept {
 
 void uploadPopTopTextures(KeyboardSession& s) noexcept {
   PopTopTextureSet& t = s.popTopTextures;
+  renew(t);
   const std::uint8_t mask = s.keyMask;
   uploadPositional(t.letters, 10, images::kLetterGlyphs, s.letters, mask);
   uploadPositional(t.shiftedLetters, 10, images::kShiftedLetterGlyphs, s.letters, mask);

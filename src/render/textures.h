@@ -1,12 +1,18 @@
 // GL textures of the three surfaces: uploadTexture and the three texture sets.
 //
-// The keyboard's and the top pop-up's texture sets belong to the session (their glyph entries
-// follow its layout, so two keyboards drawn in one GL context must not share them); the field
-// pop-up's set, which depends on no layout, is one for the whole process. Every creation of a
-// surface generates fresh names (one glGenTextures per entry of the upload list, before the
-// entry's textures are filled) and overwrites its set; old names are never deleted, they go
-// with the GL context that the app recreates. The names are stored as relaxed atomics: a frame
-// may be drawing from a set on another GL thread while it is replaced.
+// All three texture sets belong to the session: two keyboards drawn in one GL context must not
+// share glyphs that follow their layouts, and a set made in one context means nothing in
+// another. Every creation of a surface generates fresh names (one glGenTextures per entry of
+// the upload list, before the entry's textures are filled) and overwrites its set. A set
+// remembers the GL context its names were made in (eglGetCurrentContext()): when it is made
+// again in that same context, its old names are deleted before the new ones are generated, so
+// an app that re-creates surfaces in a context it keeps (a reshuffle after done) does not pile
+// up textures. Old names made in another context, or with none current, are never deleted:
+// they go with their context, and here their numbers may be someone else's. Nor are names that
+// another keyboard's set made in the current context holds (a new context may get a destroyed
+// one's handle back).
+// The names are stored as relaxed atomics: a frame may be drawing from a set on another GL
+// thread while it is replaced (never in the same context, where the deleting happens).
 //
 // Glyph entries are positional: element i shows the character that the session's layout holds
 // at position i at upload time. The stored (masked) byte is unmasked only for the lookup of its
@@ -23,6 +29,7 @@ namespace tessel {
 struct KeyboardSession;
 
 using TextureName = RelaxedField<std::uint32_t>;
+using GlContextTag = RelaxedField<const void*>;  // an EGLContext; null before the first upload
 
 struct MainTextureSet {
   TextureName backgroundTexture;
@@ -43,6 +50,7 @@ struct MainTextureSet {
   TextureName padLabelTextures[4];
   TextureName padDoneIconTexture;
   TextureName padDigitTextures[10];      // by pad position
+  GlContextTag madeIn;
 };
 
 struct PopTextureSet {
@@ -51,15 +59,52 @@ struct PopTextureSet {
   TextureName dot;
   TextureName cursor;
   TextureName balloon;
+  GlContextTag madeIn;
 };
 
 struct PopTopTextureSet {
   TextureName letters[10];        // top-row positions 0..9, lower case
   TextureName shiftedLetters[10];
   TextureName symbols[10];        // first symbol page
+  GlContextTag madeIn;
 };
 
-PopTextureSet& popTextures() noexcept;
+// Calls f(names, count) for each entry of a set's upload list, in upload order.
+template <typename F>
+void forEachEntry(const MainTextureSet& t, F f) {
+  f(&t.backgroundTexture, 1);
+  f(t.charKeyTextures, 3);
+  f(t.letterTextures, 26);
+  f(t.letterShiftTextures, 26);
+  f(t.symbolTextures, 26);
+  f(t.symbolShiftTextures, 26);
+  f(t.spaceKeyTextures, 2);
+  f(&t.spaceLabelTexture, 1);
+  f(t.shiftDeleteKeyTextures, 2);
+  f(t.switchKeyTextures, 2);
+  f(t.doneKeyTextures, 2);
+  f(t.iconTextures, 4);
+  f(t.labelTextures, 5);
+  f(t.padKeyTextures, 2);
+  f(t.padDoneKeyTextures, 2);
+  f(t.padLabelTextures, 4);
+  f(&t.padDoneIconTexture, 1);
+  f(t.padDigitTextures, 10);
+}
+template <typename F>
+void forEachEntry(const PopTextureSet& t, F f) {
+  f(&t.background, 1);
+  f(&t.frame, 1);
+  f(&t.dot, 1);
+  f(&t.cursor, 1);
+  f(&t.balloon, 1);
+}
+template <typename F>
+void forEachEntry(const PopTopTextureSet& t, F f) {
+  f(t.letters, 10);
+  f(t.shiftedLetters, 10);
+  f(t.symbols, 10);
+}
 
 // Binds `name` and fills it from the image: MIN_FILTER nearest, MAG_FILTER linear, both wraps
 // clamp-to-edge (set with glTexParameterf, in that order), texture environment replace, then
@@ -71,7 +116,7 @@ void uploadTexture(std::uint32_t name, const TextureImage& image) noexcept;
 // A layout byte that does not unmask to a character of the glyph tables leaves its texture
 // name generated but empty.
 void uploadMainTextures(KeyboardSession& session) noexcept;
-void uploadPopTextures() noexcept;
+void uploadPopTextures(KeyboardSession& session) noexcept;
 void uploadPopTopTextures(KeyboardSession& session) noexcept;
 
 }  // namespace tessel

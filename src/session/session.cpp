@@ -185,8 +185,7 @@ void SessionRef::reset() noexcept {
 }
 
 void applySeal(ContentStore& store) noexcept {
-  Rc4State state;
-  rc4Init(state, kSealKey, sizeof kSealKey);
+  Rc4State state = store.cipherState;  // the seal key's schedule, made once at creation
   const std::size_t n = store.length;
   rc4Crypt(state, store.plaintext, store.plaintext, n);
   wipeObject(state);

@@ -96,9 +96,10 @@ struct KeyboardSession {
   std::recursive_mutex lock;                        // layout build + texture upload
   std::mutex opLock;                                // one text operation or setter at a time
   std::atomic<int> pins{1};                         // the table's reference + calls in progress
-  // This keyboard's own texture names: two keyboards whose surfaces share one GL context each
-  // draw their own layout. The field pop-up's images depend on no layout and stay process-wide.
+  // This keyboard's own texture names, one set per surface (render/textures.h): two keyboards
+  // whose surfaces share one GL context each draw their own.
   MainTextureSet mainTextures;
+  PopTextureSet popTextures;
   PopTopTextureSet popTopTextures;
 };
 

@@ -3,6 +3,7 @@
 #include "window.h"
 
 #define GLFW_INCLUDE_NONE
+#include <EGL/egl.h>
 #include <GLES/gl.h>
 #include <GLES/glext.h>
 #include <GLFW/glfw3.h>
@@ -208,47 +209,21 @@ class KeyOverlay {
   int width_ = 0, height_ = 0, textureWidth_ = 1, textureHeight_ = 1;
 };
 
-void deleteNames(const TextureName* names, std::size_t count) {
-  for (std::size_t k = 0; k < count; ++k) {
-    const GLuint name = names[k].load();
-    if (name != 0) glDeleteTextures(1, &name);
-  }
-}
-template <std::size_t N>
-void deleteNames(const TextureName (&names)[N]) {
-  deleteNames(names, N);
-}
-void deleteNames(const TextureName& name) { deleteNames(&name, 1); }
-
 // An app's surfaces lose their GL context with the keyboard, and their textures with it; the
-// demo keeps one context, so it deletes the three sets' textures before the surfaces are
-// created again.
+// demo keeps one context, so the three sets' textures must go before the surfaces are created
+// again. In an EGL context the library deletes them itself; under GLX it cannot tell the
+// context apart, so the demo does.
 void deleteSurfaceTextures(const KeyboardSession& s) {
-  const MainTextureSet& m = s.mainTextures;
-  deleteNames(m.backgroundTexture);
-  deleteNames(m.charKeyTextures);
-  deleteNames(m.letterTextures);
-  deleteNames(m.letterShiftTextures);
-  deleteNames(m.symbolTextures);
-  deleteNames(m.symbolShiftTextures);
-  deleteNames(m.spaceKeyTextures);
-  deleteNames(m.spaceLabelTexture);
-  deleteNames(m.shiftDeleteKeyTextures);
-  deleteNames(m.switchKeyTextures);
-  deleteNames(m.doneKeyTextures);
-  deleteNames(m.iconTextures);
-  deleteNames(m.labelTextures);
-  deleteNames(m.padKeyTextures);
-  deleteNames(m.padDoneKeyTextures);
-  deleteNames(m.padLabelTextures);
-  deleteNames(m.padDoneIconTexture);
-  deleteNames(m.padDigitTextures);
-  const PopTextureSet& p = popTextures();
-  for (const TextureName* name : {&p.background, &p.frame, &p.dot, &p.cursor, &p.balloon}) deleteNames(*name);
-  const PopTopTextureSet& t = s.popTopTextures;
-  deleteNames(t.letters);
-  deleteNames(t.shiftedLetters);
-  deleteNames(t.symbols);
+  if (eglGetCurrentContext() != EGL_NO_CONTEXT) return;
+  auto remove = [](const TextureName* names, int count) {
+    for (int k = 0; k < count; ++k) {
+      const GLuint name = names[k].load();
+      if (name != 0) glDeleteTextures(1, &name);
+    }
+  };
+  forEachEntry(s.mainTextures, remove);
+  forEachEntry(s.popTextures, remove);
+  forEachEntry(s.popTopTextures, remove);
 }
 
 void createSurfaces(KeyboardSession& s) {
