@@ -6,6 +6,7 @@
 
 #include <cstddef>
 
+#include "render/artwork.h"
 #include "render/glyph_index.h"
 #include "session/session.h"
 
@@ -61,16 +62,19 @@ void uploadPositional(TextureName* out, int count, const ImageGroup& group,
 PopTextureSet& popTextures() noexcept { return gPop; }
 
 void uploadTexture(std::uint32_t name, const TextureImage& image) noexcept {
+  const std::uint8_t* pixels = artworkPixels(image);
+  if (pixels == nullptr) return;
   glBindTexture(GL_TEXTURE_2D, name);
   glTexParameterf(GL_TEXTURE_2D, GL_TEXTURE_MIN_FILTER, static_cast<GLfloat>(GL_NEAREST));
   glTexParameterf(GL_TEXTURE_2D, GL_TEXTURE_MAG_FILTER, static_cast<GLfloat>(GL_LINEAR));
   glTexParameterf(GL_TEXTURE_2D, GL_TEXTURE_WRAP_S, static_cast<GLfloat>(GL_CLAMP_TO_EDGE));
   glTexParameterf(GL_TEXTURE_2D, GL_TEXTURE_WRAP_T, static_cast<GLfloat>(GL_CLAMP_TO_EDGE));
   glTexEnvf(GL_TEXTURE_ENV, GL_TEXTURE_ENV_MODE, static_cast<GLfloat>(GL_REPLACE));
-  glTexImage2D(GL_TEXTURE_2D, 0, GL_RGBA, image.width, image.height, 0, GL_RGBA, GL_UNSIGNED_BYTE, image.pixels);
+  glTexImage2D(GL_TEXTURE_2D, 0, GL_RGBA, image.width, image.height, 0, GL_RGBA, GL_UNSIGNED_BYTE, pixels);
 }
 
 void uploadMainTextures(KeyboardSession& s) noexcept {
+  const ArtworkHold hold;
   MainTextureSet& t = s.mainTextures;
   const std::uint8_t mask = s.keyMask;
   uploadPlain(t.backgroundTexture, images::kBackgroundPixels);
@@ -94,6 +98,7 @@ void uploadMainTextures(KeyboardSession& s) noexcept {
 }
 
 void uploadPopTextures() noexcept {
+  const ArtworkHold hold;
   PopTextureSet& t = gPop;
   uploadPlain(t.background, images::kBackgroundPixels);
   uploadPlain(t.frame, images::kFieldFramePixels);
@@ -103,6 +108,7 @@ void uploadPopTextures() noexcept {
 }
 
 void uploadPopTopTextures(KeyboardSession& s) noexcept {
+  const ArtworkHold hold;
   PopTopTextureSet& t = s.popTopTextures;
   const std::uint8_t mask = s.keyMask;
   uploadPositional(t.letters, 10, images::kLetterGlyphs, s.letters, mask);
