@@ -54,12 +54,15 @@ strong_layout() {
   ctest --test-dir build-strong --output-on-failure -j"$jobs" -R "^(${suites// /|})\$"
 }
 
-# The compact artwork build: its library's size and its suite (uploads byte for byte those of
-# the raw pixels, and the failure paths), in a release build and under ASan+UBSan.
+# The compact artwork build: its library's size (text + data, as `size` reports them) and its
+# suite (uploads byte for byte those of the raw pixels, the failure paths), in a release build
+# and under ASan+UBSan.
 compact_artwork() {
   local targets="TesselVIP compact_artwork compact_artwork_raw" options="-DTESSEL_WERROR=ON -DTESSEL_BUILD_TOOLS=OFF"
   cmake -S . -B build-compact -G Ninja -DCMAKE_BUILD_TYPE=Release $options -DTESSEL_COMPACT_ARTWORK=ON >/dev/null
   cmake --build build-compact -j"$jobs" --target $targets
+  size build-compact/libTesselVIP.so | awk 'NR == 2 { print "libTesselVIP.so: text + data", $1 + $2, "bytes (at most 600 KB)"
+                                                      exit ($1 + $2 > 600000) }'
   ctest --test-dir build-compact --output-on-failure
   cmake -S . -B build-compact-asan -G Ninja -DCMAKE_BUILD_TYPE=RelWithDebInfo $options -DTESSEL_COMPACT_ARTWORK=ON \
         -DTESSEL_SANITIZE=address,undefined >/dev/null
