@@ -88,7 +88,7 @@ stage "strong layout randomness build" strong_layout
 stage "ThreadSanitizer: UI/GL thread stress" bash tools/run_tsan.sh
 stage "libFuzzer smoke run (~12 s per target)" bash tools/run_fuzz.sh smoke
 stage "ASan+UBSan build and tests" asan_ubsan
-stage "compact artwork build (release, ASan+UBSan)" compact_artwork
+stage "compact artwork build, release + ASan" compact_artwork
 
 echo
 echo "== summary"
