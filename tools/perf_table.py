@@ -25,7 +25,9 @@ END = "<!-- perf-table:end -->"
 #   surface created to first frame, and the library's own share), "growth" (render: resident
 #   memory added by repeated surface creation, and the time per round), "worst" (ours and peer are name
 #   prefixes: every text of a hostile pattern, worst first), "added" (the peer is the same
-#   operation before a change: the difference in CPU time).
+#   operation before a change: the difference in CPU time), "startup_added" (start-up in another
+#   build: peer names the default build's program, which ran the same benchmark; the difference
+#   in wall time).
 ROWS = [
     ("RSA public op, 1024 bits", "crypto_bench", "BM_RsaPublic_Ours/1024", "BM_RsaPublic_OpenSsl/1024", "OpenSSL", "time", "≤ 1.1×"),
     ("RSA public op, 2048 bits", "crypto_bench", "BM_RsaPublic_Ours/2048", "BM_RsaPublic_OpenSsl/2048", "OpenSSL", "time", "≤ 1.1×"),
@@ -65,6 +67,11 @@ ROWS = [
     ("Start-up of the top pop-up", "render_bench", "BM_StartUp/surface:2/iterations:15", None, "", "startup", "library ≤ 1/10"),
     ("300 re-creations of the three surfaces in one GL context (reshuffle after done)", "render_bench",
      "BM_TextureGrowth/rounds:300/iterations:1", None, "", "growth", "≤ 10 MiB"),
+] + [
+    (f"Start-up of the {what}, compact artwork build (`-DTESSEL_COMPACT_ARTWORK=ON`)", "render_bench_compact",
+     f"BM_StartUp/surface:{n}/iterations:15", "render_bench", "default build", "startup_added", "≤ +10 ms")
+    for n, what in enumerate(("keyboard", "field pop-up", "top pop-up"))
+] + [
     ("A touch (down + up), session pinned exclusively", "session_bench", "BM_Touch/1", "BM_Touch/0", "raw pointer, as before pinning", "added", "≤ +50 ns"),
     ("`getNativeContentLen`, session pinned", "session_bench", "BM_ContentLen/1", "BM_ContentLen/0", "raw pointer, as before pinning", "added", "≤ +50 ns"),
     ("One pin, shared (what a frame or surface call adds)", "session_bench", "BM_PinOnly/0", None, "", "alone", "≤ 1 µs per frame"),
@@ -117,6 +124,10 @@ def duration(ns):
     return f"{ns:.3g} ns"
 
 
+def signed(ns):
+    return ("+" if ns >= 0 else "−") + duration(abs(ns))
+
+
 def rate(bytes_per_s):
     return f"{bytes_per_s / 1e9:.3g} GB/s" if bytes_per_s >= 1e9 else f"{bytes_per_s / 1e6:.3g} MB/s"
 
@@ -142,10 +153,21 @@ def worst_row(runs, what, program, ours_prefix, peer_prefix, peer_label, target,
     return f"| {what} | {' / '.join(ours)} | {peer_label} {' / '.join(peer)} | | {target} |"
 
 
-def table(runs):
+def table(runs, meta):
     lines = ["| What (`bench/…`) | Ours | Peer | Ratio | Target |", "|---|---|---|---|---|"]
     used, seen_programs = set(), set()
     for what, program, ours_name, peer_name, peer_label, metric, target in ROWS:
+        if metric == "startup_added":
+            ours, peer = runs.get((program, ours_name)), runs.get((peer_name, ours_name))
+            if ours and peer:
+                used.update({(program, ours_name), (peer_name, ours_name)})
+                wall, own = (lambda b: b.get("start_up_ms", 0) * 1e6), (lambda b: b.get("own_us", 0) * 1e3)
+                added = [statistics.median(paired(ours, peer, lambda a, b: f(a) - f(b))) for f in (wall, own)]
+                lines.append(f"| {what} | {spread([wall(b) for b in ours], duration)} wall; library's own CPU "
+                             f"{spread([own(b) for b in ours], duration)} | {peer_label} "
+                             f"{spread([wall(b) for b in peer], duration)} | {signed(added[0])} wall, "
+                             f"{signed(added[1])} library CPU | {target} |")
+            continue
         if metric == "worst":
             row = worst_row(runs, what, program, ours_name, peer_name, peer_label, target, used)
             if row:
@@ -198,6 +220,7 @@ def table(runs):
             ratio = spread(paired(ours, peer, lambda a, b: cpu_ns(a) / cpu_ns(b)), times)
             lines.append(f"| {label} | {spread([cpu_ns(b) for b in ours], duration)} | {peer_label} "
                          f"{spread([cpu_ns(b) for b in peer], duration)} | {ratio} time | {target} |")
+    lines += size_row(meta)
     others = sorted(k for k in runs if k not in used)
     if others:
         lines.append("")
@@ -205,6 +228,15 @@ def table(runs):
                      "; ".join(f"`{p}` {n} {duration(statistics.median(cpu_ns(b) for b in runs[(p, n)]))}"
                                for p, n in others) + ".")
     return lines
+
+
+def size_row(meta):
+    """libTesselVIP.so of both builds: text + data as `size` reports them (what the file carries)."""
+    if not meta.get("so_size_compact"):
+        return []
+    ours, peer = int(meta["so_size_compact"]), int(meta["so_size"])
+    return [f"| `libTesselVIP.so` x86-64, compact artwork build: text + data (`size`) | {ours / 1e3:.0f} KB | "
+            f"default build {peer / 1e6:.2f} MB | {times(ours / peer)} size | ≤ 600 KB |"]
 
 
 def main():
@@ -221,7 +253,7 @@ def main():
         f"ours and the peer in the same program; CPU time per operation, ratios per repetition; a range "
         f"(min–max) where the repetitions differ by more than {SPREAD:.0%}.",
         "",
-    ] + table(runs) + [
+    ] + table(runs, meta) + [
         "",
         "Each program first prints Google Benchmark's \"Library was built as DEBUG\" warning: Debian's "
         "libbenchmark package is built without `NDEBUG`; the timed loop is inlined from its header into our "

@@ -1,8 +1,8 @@
 #!/usr/bin/env bash
 # Builds and runs every test: the release build with warnings as errors (unit, JVM, GL and
 # window suites), the layout suites with the hardened layout option, the thread stress suite
-# under ThreadSanitizer, a libFuzzer smoke run, and the whole unit suite again under
-# AddressSanitizer + UndefinedBehaviorSanitizer.
+# under ThreadSanitizer, a libFuzzer smoke run, the whole unit suite again under
+# AddressSanitizer + UndefinedBehaviorSanitizer, and the compact artwork build's suite.
 #
 # Every stage runs even when an earlier one failed, so the closing summary is complete: one row
 # per stage (result, wall time, CTest counts), then "N passed, N failed" over all stages' CTest
@@ -54,6 +54,24 @@ strong_layout() {
   ctest --test-dir build-strong --output-on-failure -j"$jobs" -R "^(${suites// /|})\$"
 }
 
+# The compact artwork build: its library's size (text + data, as `size` reports them) and its
+# suite (uploads byte for byte those of the raw pixels, the failure paths), in a release build
+# and under ASan+UBSan.
+compact_artwork() {
+  local targets="TesselVIP compact_artwork compact_artwork_raw" options="-DTESSEL_WERROR=ON -DTESSEL_BUILD_TOOLS=OFF"
+  cmake -S . -B build-compact -G Ninja -DCMAKE_BUILD_TYPE=Release $options -DTESSEL_COMPACT_ARTWORK=ON >/dev/null
+  cmake --build build-compact -j"$jobs" --target $targets
+  size build-compact/libTesselVIP.so | awk 'NR == 2 { print "libTesselVIP.so: text + data", $1 + $2, "bytes (at most 600 KB)"
+                                                      exit ($1 + $2 > 600000) }'
+  ctest --test-dir build-compact --output-on-failure
+  cmake -S . -B build-compact-asan -G Ninja -DCMAKE_BUILD_TYPE=RelWithDebInfo $options -DTESSEL_COMPACT_ARTWORK=ON \
+        -DTESSEL_SANITIZE=address,undefined >/dev/null
+  cmake --build build-compact-asan -j"$jobs" --target $targets
+  ASAN_OPTIONS=detect_leaks=1 UBSAN_OPTIONS=print_stacktrace=1 \
+    LSAN_OPTIONS=suppressions="$PWD/tests/lsan.supp":print_suppressions=0 \
+    ctest --test-dir build-compact-asan --output-on-failure
+}
+
 # Suites labelled nosan (the allocator-wrapping hygiene suite, the demos) run in the release
 # pass only.
 asan_ubsan() {
@@ -70,6 +88,7 @@ stage "strong layout randomness build" strong_layout
 stage "ThreadSanitizer: UI/GL thread stress" bash tools/run_tsan.sh
 stage "libFuzzer smoke run (~12 s per target)" bash tools/run_fuzz.sh smoke
 stage "ASan+UBSan build and tests" asan_ubsan
+stage "compact artwork build, release + ASan" compact_artwork
 
 echo
 echo "== summary"

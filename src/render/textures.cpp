@@ -8,6 +8,7 @@
 #include <algorithm>
 #include <cstddef>
 
+#include "render/artwork.h"
 #include "render/glyph_index.h"
 #include "session/session.h"
 
@@ -112,16 +113,19 @@ void uploadPositional(TextureName* out, int count, const ImageGroup& group,
 }  // namespace
 
 void uploadTexture(std::uint32_t name, const TextureImage& image) noexcept {
+  const std::uint8_t* pixels = artworkPixels(image);
+  if (pixels == nullptr) return;
   glBindTexture(GL_TEXTURE_2D, name);
   glTexParameterf(GL_TEXTURE_2D, GL_TEXTURE_MIN_FILTER, static_cast<GLfloat>(GL_NEAREST));
   glTexParameterf(GL_TEXTURE_2D, GL_TEXTURE_MAG_FILTER, static_cast<GLfloat>(GL_LINEAR));
   glTexParameterf(GL_TEXTURE_2D, GL_TEXTURE_WRAP_S, static_cast<GLfloat>(GL_CLAMP_TO_EDGE));
   glTexParameterf(GL_TEXTURE_2D, GL_TEXTURE_WRAP_T, static_cast<GLfloat>(GL_CLAMP_TO_EDGE));
   glTexEnvf(GL_TEXTURE_ENV, GL_TEXTURE_ENV_MODE, static_cast<GLfloat>(GL_REPLACE));
-  glTexImage2D(GL_TEXTURE_2D, 0, GL_RGBA, image.width, image.height, 0, GL_RGBA, GL_UNSIGNED_BYTE, image.pixels);
+  glTexImage2D(GL_TEXTURE_2D, 0, GL_RGBA, image.width, image.height, 0, GL_RGBA, GL_UNSIGNED_BYTE, pixels);
 }
 
 void uploadMainTextures(KeyboardSession& s) noexcept {
+  const ArtworkHold hold;
   MainTextureSet& t = s.mainTextures;
   renew(t);
   const std::uint8_t mask = s.keyMask;
@@ -146,6 +150,7 @@ void uploadMainTextures(KeyboardSession& s) noexcept {
 }
 
 void uploadPopTextures(KeyboardSession& s) noexcept {
+  const ArtworkHold hold;
   PopTextureSet& t = s.popTextures;
   renew(t);
   uploadPlain(t.background, images::kBackgroundPixels);
@@ -156,6 +161,7 @@ void uploadPopTextures(KeyboardSession& s) noexcept {
 }
 
 void uploadPopTopTextures(KeyboardSession& s) noexcept {
+  const ArtworkHold hold;
   PopTopTextureSet& t = s.popTopTextures;
   renew(t);
   const std::uint8_t mask = s.keyMask;

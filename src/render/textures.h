@@ -109,10 +109,13 @@ void forEachEntry(const PopTopTextureSet& t, F f) {
 // Binds `name` and fills it from the image: MIN_FILTER nearest, MAG_FILTER linear, both wraps
 // clamp-to-edge (set with glTexParameterf, in that order), texture environment replace, then
 // glTexImage2D RGBA/UNSIGNED_BYTE straight from the embedded pixels. No mipmaps: the nearest
-// minifying filter never needs them. Needs a current GL context.
+// minifying filter never needs them. Needs a current GL context. In a compact artwork build the
+// pixels come through artworkPixels (render/artwork.h): when they cannot be inflated the name is
+// left without an image, untouched.
 void uploadTexture(std::uint32_t name, const TextureImage& image) noexcept;
 
 // The upload lists (GL context current; the session's layout built for the positional glyphs).
+// Each keeps an ArtworkHold for its whole length.
 // A layout byte that does not unmask to a character of the glyph tables leaves its texture
 // name generated but empty.
 void uploadMainTextures(KeyboardSession& session) noexcept;
