@@ -10,7 +10,7 @@
 #include <stdexcept>
 #include <string>
 
-#include "crypto/dispatcher.h"
+#include "output/dispatcher.h"
 #include "server/envelope.h"
 
 namespace {

@@ -20,7 +20,7 @@
 #include <cstring>
 #include <string>
 
-#include "crypto/dispatcher.h"
+#include "output/dispatcher.h"
 #include "crypto/error_table.h"
 #include "crypto/moduli.h"
 #include "crypto/rsa.h"

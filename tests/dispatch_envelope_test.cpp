@@ -9,8 +9,8 @@
 #include <string>
 #include <vector>
 
-#include "crypto/dispatcher.h"
-#include "crypto/envelope.h"
+#include "output/dispatcher.h"
+#include "output/envelope.h"
 #include "crypto/random.h"
 #include "support/dispatch_oracle.h"
 

@@ -8,8 +8,8 @@
 #include <set>
 #include <string>
 
-#include "crypto/dispatch_payloads.h"
-#include "crypto/dispatcher.h"
+#include "output/dispatch_payloads.h"
+#include "output/dispatcher.h"
 #include "crypto/random.h"
 #include "server/envelope.h"
 #include "support/dispatch_oracle.h"

@@ -16,7 +16,7 @@
 #include <string>
 #include <vector>
 
-#include "crypto/measure.h"
+#include "session/output.h"
 #include "input/layout.h"
 #include "pattern/strength.h"
 #include "session/output.h"

@@ -13,7 +13,7 @@
 #include <vector>
 
 #include "input/layout.h"
-#include "input/rand48.h"
+#include "crypto/rand48.h"
 #include "session/session.h"
 
 namespace tessel {

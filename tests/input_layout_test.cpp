@@ -9,7 +9,7 @@
 #include <string>
 
 #include "input/layout.h"
-#include "input/rand48.h"
+#include "crypto/rand48.h"
 #include "session/session.h"
 #include "support/keyboard_typist.h"
 

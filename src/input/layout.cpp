@@ -13,7 +13,7 @@
 #include <utility>
 
 #include "crypto/wipe.h"
-#include "input/rand48.h"
+#include "crypto/rand48.h"
 #include "session/session.h"
 
 namespace tessel {

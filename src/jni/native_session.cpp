@@ -13,7 +13,7 @@
 #include <cstdint>
 
 #include "crypto/error_table.h"
-#include "crypto/measure.h"
+#include "session/output.h"
 #include "jni/jni_support.h"
 #include "jni/version.h"
 #include "pattern/strength.h"

@@ -1,4 +1,4 @@
-// The session's output operations. Both work on the typed text only inside a ContentGuard, so
+// The session's output operations. Each works on the typed text only inside a ContentGuard, so
 // the content is resealed on every way out; every copy of the text they make is a SecureBuffer.
 #include "session/output.h"
 
@@ -6,11 +6,12 @@
 #include <utility>
 
 #include "crypto/codec.h"
-#include "crypto/dispatcher.h"
+#include "crypto/md5.h"
 #include "crypto/moduli.h"
 #include "crypto/rc4.h"
 #include "crypto/sha1.h"
 #include "crypto/wipe.h"
+#include "output/dispatcher.h"
 #include "session/session.h"
 
 namespace tessel {
@@ -71,6 +72,12 @@ SecureBuffer encryptedPinCode(KeyboardSession& session) noexcept {
   }
   store.lastError = kOk;
   return text;
+}
+
+SecureBuffer computeMeasureValue(KeyboardSession& session) noexcept {
+  if (session.content->length == 0) return SecureBuffer();
+  ContentGuard guard(*session.content);
+  return md5HexLower(guard.text(), guard.length());
 }
 
 }  // namespace tessel

@@ -1,4 +1,5 @@
-// The session's output operations: content envelopes and the encrypted PIN code.
+// The session's output operations: content envelopes, the encrypted PIN code and the measure
+// value. Each unseals the text for the length of the call and reseals it on the way out.
 #pragma once
 
 #include "crypto/secure_buffer.h"
@@ -19,5 +20,8 @@ SecureBuffer contentOutput(KeyboardSession& session, int type, const char* times
 // lastError: 100 no challenge code, 102 no memory for the copy, 101 empty content (or no
 // memory for the text), 0 on success. The RC4 state, key and copy are wiped on every path.
 SecureBuffer encryptedPinCode(KeyboardSession& session) noexcept;
+
+// The measure value: 32 lower-case hex digits of MD5 over the text, or absent for empty content.
+SecureBuffer computeMeasureValue(KeyboardSession& session) noexcept;
 
 }  // namespace tessel

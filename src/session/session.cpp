@@ -10,7 +10,7 @@
 #include <new>
 
 #include "crypto/wipe.h"
-#include "input/rand48.h"
+#include "crypto/rand48.h"
 #include "pattern/pattern_engine.h"
 
 namespace tessel {

@@ -24,8 +24,8 @@
 
 #include "crypto/error_table.h"
 #include "crypto/rc4.h"
-#include "render/textures.h"
 #include "session/relaxed_field.h"
+#include "session/texture_sets.h"
 
 namespace tessel {
 

@@ -18,7 +18,7 @@
 #include <sys/stat.h>
 
 #include "crypto/error_table.h"
-#include "crypto/measure.h"
+#include "session/output.h"
 #include "crypto/moduli.h"
 #include "input/touch.h"
 #include "offscreen.h"

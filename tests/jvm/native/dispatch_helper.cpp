@@ -3,8 +3,8 @@
 // methods only ever pass 47 and 48; null when it refuses), and the deployment's type-68 master keys.
 #include <jni.h>
 
-#include "crypto/dispatch_payloads.h"
-#include "crypto/dispatcher.h"
+#include "output/dispatch_payloads.h"
+#include "output/dispatcher.h"
 
 namespace {
 

@@ -1,7 +1,7 @@
 // Payload builders of the dedicated encryption types. All secrets (digests of the password, the
 // triple-DES keys of types 38 and 68, the PIN blocks and their hex forms) live in SecureBuffers
 // or in stack objects wiped before every return.
-#include "crypto/dispatch_payloads.h"
+#include "output/dispatch_payloads.h"
 
 #include <algorithm>
 #include <cstdio>
@@ -9,7 +9,7 @@
 #include <utility>
 
 #include "crypto/codec.h"
-#include "crypto/envelope.h"
+#include "output/envelope.h"
 #include "crypto/md5.h"
 #include "crypto/padding.h"
 #include "crypto/random.h"

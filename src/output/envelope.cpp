@@ -2,7 +2,7 @@
 // helpers share one path (block -> RSA -> hex, or bytes and base64) and differ only in the
 // block layout and its error code; the byte forms skip the hex round trip. Nothing here keeps state; the random source is the only
 // thing shared with other threads.
-#include "crypto/envelope.h"
+#include "output/envelope.h"
 
 #include <algorithm>
 #include <cstdio>

@@ -2,14 +2,14 @@
 // what it wraps and how; encryptionDispatch makes the checks in their fixed order (timestamp,
 // text, result, type, moduli) and then builds the output. The first failure ends the call and
 // its code is passed up unchanged.
-#include "crypto/dispatcher.h"
+#include "output/dispatcher.h"
 
 #include <cstdint>
 #include <cstring>
 #include <utility>
 
-#include "crypto/dispatch_payloads.h"
-#include "crypto/envelope.h"
+#include "output/dispatch_payloads.h"
+#include "output/envelope.h"
 #include "pattern/strength.h"
 
 namespace tessel {

@@ -1,5 +1,5 @@
 // lrand48/srand48 behind one lock; uniform draws from the system random source.
-#include "input/rand48.h"
+#include "crypto/rand48.h"
 
 #include <cstdint>
 #include <cstdlib>
