@@ -50,8 +50,11 @@ final class Bank {
     List<String> cmd = new ArrayList<>(List.of(cppTool));
     cmd.addAll(args);
     Process p = new ProcessBuilder(cmd).start();
-    p.getOutputStream().write(output.getBytes(StandardCharsets.ISO_8859_1));
-    p.getOutputStream().close();
+    try (var stdin = p.getOutputStream()) {
+      stdin.write(output.getBytes(StandardCharsets.ISO_8859_1));
+    } catch (java.io.IOException e) {
+      // it stopped reading (an output over the cap): its answer is what counts
+    }
     byte[] stdout = p.getInputStream().readAllBytes();
     return parse(p.waitFor(), stdout, p.getErrorStream().readAllBytes());
   }
