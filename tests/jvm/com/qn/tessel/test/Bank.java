@@ -82,6 +82,10 @@ final class Bank {
 
   // ---- oracles
 
+  static String latin1(byte[] b) {
+    return new String(b, StandardCharsets.ISO_8859_1);
+  }
+
   static byte[] ascii(String s) {
     return s.getBytes(StandardCharsets.ISO_8859_1);
   }

@@ -68,7 +68,7 @@ final class OutputTests {
     }
   }
 
-  private static native String dispatch(int type, String app, String enc, String text, String timestamp);
+  static native String dispatch(int type, String app, String enc, String text, String timestamp);
 
   private static native byte[] masterPinKey(char selector);
 

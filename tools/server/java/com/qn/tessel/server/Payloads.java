@@ -62,8 +62,8 @@ final class Payloads {
     };
   }
 
-  private static Result message(Rsa.Unwrapped u, int[] valid) {
-    return new Result(u.message(), null, valid[0] & u.valid());
+  private static Result message(byte[] message, int[] valid) {
+    return new Result(message, null, valid[0]);
   }
 
   /**
@@ -131,8 +131,7 @@ final class Payloads {
    * "%02d" timestamp "%02d" text; a length of 100 or more has three digits: the reading that
    * consumes the pair exactly is taken.
    */
-  private static Result pair(Request r, Rsa.Unwrapped u, int[] valid) {
-    final byte[] p = u.message();
+  private static Result pair(Request r, byte[] p, int[] valid) {
     int tsFrom = -1;
     int tsLen = 0;
     int textFrom = -1;
@@ -149,7 +148,7 @@ final class Payloads {
       }
     }
     try {
-      int ok = valid[0] & u.valid() & ~(tsFrom >> 31);
+      int ok = valid[0] & ~(tsFrom >> 31);
       if (tsFrom < 0) return new Result(new byte[0], new byte[0], 0);
       byte[] ts = Arrays.copyOfRange(p, tsFrom, tsFrom + tsLen);
       if (r.timestamp() != null) {
@@ -171,11 +170,10 @@ final class Payloads {
   }
 
   /** "011" "%02d"(L) text (three digits from 100 on). */
-  private static Result type19(Rsa.Unwrapped u, int[] valid) {
-    final byte[] p = u.message();
+  private static Result type19(byte[] p, int[] valid) {
     try {
       if (p.length < 5) return new Result(new byte[0], null, 0);  // lengths are no signal: synthetic ones vary too
-      int ok = valid[0] & u.valid();
+      int ok = valid[0];
       final int digits = p.length - 5 < 100 ? 2 : 3;
       final int n = p.length - 3 - digits;
       ok &= Bytes.equalMask(p, 0, TYPE19_HEAD, 0, 3) & Bytes.zeroMask(number(p, 3, digits) - n);
@@ -191,13 +189,12 @@ final class Payloads {
     byte[] block = new byte[8];
     if (v.length > 16) valid[0] &= Bytes.hexInto(v, 0, 16, block);
     else valid[0] = 0;
-    Rsa.Unwrapped u = r.key().pkcs1(rsaValue(r, Math.min(16, v.length), v.length, false, valid), 30);
-    final byte[] der = u.message();
+    final byte[] der = r.key().pkcs1(rsaValue(r, Math.min(16, v.length), v.length, false, valid), 30);
     byte[] desKey = Arrays.copyOfRange(der, 4, 20);
     byte[] plain = Bytes.tdesDecrypt(desKey, block);
     char[] hex = Bytes.toHex(plain, true);
     try {
-      int ok = valid[0] & u.valid() & Bytes.equalMask(der, 0, DER_HEAD, 0, 4) & Bytes.equalMask(der, 20, DER_TAIL, 0, 10);
+      int ok = valid[0] & Bytes.equalMask(der, 0, DER_HEAD, 0, 4) & Bytes.equalMask(der, 20, DER_TAIL, 0, 10);
       // Digits, then only F up to 16: at most 12 digits.
       int digits = 0;
       int inPadding = 0;
@@ -219,13 +216,12 @@ final class Payloads {
 
   /** RSA hex of the triple-DES-encrypted ISO 9564 format 0 block (no account number). */
   private static Result type68(Request r, int[] valid) throws OpenException {
-    Rsa.Unwrapped u = r.key().pkcs1(rsaValue(r, 0, r.value().length, false, valid), 8);
-    final byte[] sealed = u.message();
+    final byte[] sealed = r.key().pkcs1(rsaValue(r, 0, r.value().length, false, valid), 8);
     byte[] block = Bytes.tdesDecrypt(r.pinKey(), sealed);
     char[] hex = Bytes.toHex(block, true);
     try {
       final int n = Bytes.hexValue(hex[1]);
-      int ok = valid[0] & u.valid() & Bytes.zeroMask(hex[0] - '0') & ~Bytes.lessMask(n, 4) & ~Bytes.lessMask(12, n);
+      int ok = valid[0] & Bytes.zeroMask(hex[0] - '0') & ~Bytes.lessMask(n, 4) & ~Bytes.lessMask(12, n);
       final int len = Bytes.select(ok, n, 0);
       for (int k = 2; k < 16; ++k) {
         final int c = hex[k];

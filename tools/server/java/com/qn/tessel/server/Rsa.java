@@ -19,8 +19,10 @@ import javax.crypto.spec.SecretKeySpec;
  * message is derived as the IETF draft on implicit rejection for PKCS#1 v1.5 (and OpenSSL 3.2)
  * does: KDK = HMAC-SHA-256(SHA-256(d as k big-endian bytes), ciphertext as k bytes); the message
  * and its length come from HMAC-SHA-256(KDK, counter | label | bit length) blocks. The real or the
- * synthetic message is then selected with masks, so the caller runs the same RC4 and the same
- * parse on both and fails later, at one place, with one answer.
+ * synthetic message is then selected with masks and handed back as if it were real: whether the
+ * block was sound is never told, not even to the caller. A synthetic key or message fails the
+ * caller's parse (or opens to noise where the layout has no structure, as a wrong key would), in
+ * the same RC4 and the same parse as a real one.
  *
  * <p>CT: the time of {@link #pkcs1} and {@link #keyou} does not depend on the decrypted block,
  * only on k and on the selected message's length (which a valid and a synthetic message share
@@ -57,11 +59,8 @@ final class Rsa {
     Bytes.wipe(dBytes);
   }
 
-  /** The result of one unwrap: the message (real or synthetic) and whether it was real. */
-  record Unwrapped(byte[] message, int valid) {}
-
-  /** The k-byte block c^d mod n, or a block of zeros (then invalid) when c is not below n. */
-  private byte[] raw(byte[] c, int[] valid) {
+  /** The k-byte block c^d mod n, or a block of zeros (no layout passes) when c is not below n. */
+  private byte[] raw(byte[] c) {
     try {
       Cipher cipher = Cipher.getInstance("RSA/ECB/NoPadding");
       cipher.init(Cipher.DECRYPT_MODE, key);
@@ -72,7 +71,6 @@ final class Rsa {
       Bytes.wipe(out);
       return padded;
     } catch (GeneralSecurityException e) {
-      valid[0] = 0;
       return new byte[size];
     }
   }
@@ -121,14 +119,14 @@ final class Rsa {
    * Selects real (start, length) or the synthetic message at the block's end, and copies it out
    * reading both blocks at every position.
    */
-  private static Unwrapped select(byte[] block, byte[] synthetic, int valid, int start, int length, int syntheticLength) {
+  private static byte[] select(byte[] block, byte[] synthetic, int valid, int start, int length, int syntheticLength) {
     final int from = Bytes.select(valid, start, block.length - syntheticLength);
     final int n = Bytes.select(valid, length, syntheticLength);
     byte[] out = new byte[n];
     for (int j = 0; j < n; ++j) {
       out[j] = (byte) Bytes.select(valid, block[from + j], synthetic[from + j]);
     }
-    return new Unwrapped(out, valid);
+    return out;
   }
 
   private byte[] kdk(byte[] c) {
@@ -141,15 +139,14 @@ final class Rsa {
    * @param c the ciphertext, exactly {@link #size} bytes (the caller checks: public bytes)
    * @param expected the message length the layout requires, or -1 for any length
    */
-  Unwrapped pkcs1(byte[] c, int expected) {
+  byte[] pkcs1(byte[] c, int expected) {
     final int k = size;
-    final int[] valid = {-1};
-    byte[] block = raw(c, valid);
+    byte[] block = raw(c);
     byte[] kdk = kdk(c);
     byte[] synthetic = prf(kdk, MESSAGE, k);
     final int syntheticLength = expected >= 0 ? expected : syntheticLength(kdk, k - 2 - 8);
     try {
-      int ok = valid[0] & Bytes.zeroMask(block[0]) & Bytes.zeroMask((block[1] & 0xff) - 2);
+      int ok = Bytes.zeroMask(block[0]) & Bytes.zeroMask((block[1] & 0xff) - 2);
       int zeroIndex = 0;
       int found = 0;
       for (int i = 2; i < k; ++i) {
@@ -172,10 +169,9 @@ final class Rsa {
    *
    * @param c the ciphertext, exactly {@link #size} bytes
    */
-  Unwrapped keyou(byte[] c) {
+  byte[] keyou(byte[] c) {
     final int k = size;
-    final int[] valid = {-1};
-    byte[] block = raw(c, valid);
+    byte[] block = raw(c);
     byte[] kdk = kdk(c);
     byte[] synthetic = prf(kdk, MESSAGE, k);
     final int syntheticLength = syntheticLength(kdk, k - 2 - 8);
@@ -183,7 +179,7 @@ final class Rsa {
       final int tens = (block[0] & 0xff) - '0';
       final int units = (block[1] & 0xff) - '0';
       final int m = tens * 10 + units;
-      int ok = valid[0] & ~(tens >> 31) & ~(units >> 31) & Bytes.lessMask(units, 10);
+      int ok = ~(tens >> 31) & ~(units >> 31) & Bytes.lessMask(units, 10);
       ok &= ~Bytes.zeroMask(m) & ~(m >> 31) & ~Bytes.lessMask(k, m + 2);
       return select(block, synthetic, ok, 2, Bytes.select(ok, m, 0), syntheticLength);
     } finally {

@@ -23,7 +23,10 @@ import java.util.Arrays;
  * {@link OpenException} subclasses (they depend only on what the client sent). Every failure
  * from the private-key operation on is {@link OpenException.Rejected}, "output rejected": a bad
  * RSA padding continues with a synthetic key (see {@code Rsa}), so it fails where a wrong
- * content layout, another type or a stale timestamp fails, in the same time.
+ * content layout, another type or a stale timestamp fails, in the same time. A bare envelope
+ * (type 88) has no layout to fail: a forged one opens to noise, as under any wrong key; so do
+ * the payloads without structure (PKCS#1 text, "Keyou" blocks). Check the password, and give
+ * the expected timestamp, to refuse them.
  *
  * <p>The wrapper is split right after the expected timestamp when one is given
  * ({@link Options#expectedTimestamp}: freshness; replay protection needs the caller's own cache of
@@ -297,23 +300,22 @@ public final class TesselOpener {
       }
       wrappedKey = Arrays.copyOfRange(raw, 20, 20 + layout.rsaLength());
       Bytes.reverse(wrappedKey);  // stored least significant byte first
-      final Rsa.Unwrapped u = key.pkcs1(wrappedKey, 16);
-      rc4Key = u.message();
+      rc4Key = key.pkcs1(wrappedKey, 16);
       final int from = 8 + layout.keyBlobLength() + 8;
       sealed = Arrays.copyOfRange(raw, from, from + layout.contentLength());
       content = Bytes.rc4(rc4Key, drop(type), sealed);
-      if (t.outer() == Types.Outer.BARE_ENVELOPE) return accept(u.valid(), new Opened(type, null, null, null, content.clone()), null);
-      return openWrapped(type, t.inner(), content, expected, saltedHash, u.valid());
+      if (t.outer() == Types.Outer.BARE_ENVELOPE) return new Opened(type, null, null, null, content.clone());
+      return openWrapped(type, t.inner(), content, expected, saltedHash);
     } finally {
       Bytes.wipe(raw, wrappedKey, rc4Key, sealed, content);
     }
   }
 
-  /** "letter timestamp ':' payload", then the payload; valid carries the RSA step's mask. */
-  private Opened openWrapped(int type, Types.Inner inner, byte[] content, byte[] expected, boolean saltedHash, int valid)
+  /** "letter timestamp ':' payload", then the payload. */
+  private Opened openWrapped(int type, Types.Inner inner, byte[] content, byte[] expected, boolean saltedHash)
       throws OpenException {
     final int n = content.length;
-    int ok = valid;
+    int ok = -1;
     int letter = 0;
     for (int k = 0; k < LETTERS.length(); ++k) letter |= Bytes.zeroMask((n > 0 ? content[0] : 0) - LETTERS.charAt(k));
     ok &= letter;
