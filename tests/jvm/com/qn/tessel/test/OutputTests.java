@@ -31,18 +31,6 @@ import javax.crypto.spec.SecretKeySpec;
 final class OutputTests {
   private OutputTests() {}
 
-  /** Opens getNativePinContent (type 47) with both openers; returns the opened content or null. */
-  static String pinContent(KeyboardDriver k) throws Exception {
-    String out = getNativePinContent(k.handle, TIMESTAMP);
-    if (out == null) return null;
-    Bank.Result r = Bank.open(47, out, true);
-    Check.equal(0, r.exit(), "type 47 opened: " + r.stderr());
-    Check.equal(TIMESTAMP, r.get("timestamp"), "timestamp");
-    Check.equal(String.valueOf((char) getNativeDegree(k.handle)), r.get("strength"),
-        "the envelope's strength letter is the session's degree");
-    return r.get("content");
-  }
-
   /** The class of a refusal: the Java opener's exception, the C++ opener's message read alike. */
   static String refusal(String cppMessage) {
     final String[][] classes = {{"base64", "BadEncoding"}, {"longer than", "TooLong"}, {"truncated|after its content", "Truncated"},
@@ -70,11 +58,13 @@ final class OutputTests {
 
   static native String dispatch(int type, String app, String enc, String text, String timestamp);
 
-  private static native byte[] masterPinKey(char selector);
+  static native byte[] masterPinKey(char selector);
 
   static final String SEP = "::::::::::";
   static final Set<Integer> NO_OUTPUT = Set.of(21, 65, 69, 76, 77, 78, 79, 83);
   static final Set<Integer> HASHED = Set.of(47, 48, 55, 59);
+  /** Envelope types whose payload is the text (48 and 59 without a salt; the corpus always salts them). */
+  static final java.util.function.IntPredicate TEXT_PAYLOAD = t -> !HASHED.contains(t) && !ForgeryTests.RSA_PAYLOAD.contains(t);
 
   /** Two-key triple-DES ECB encryption by the JDK, the way an issuer wraps keys. */
   static String wrap(byte[] key16, byte[] data) throws Exception {
@@ -94,33 +84,7 @@ final class OutputTests {
     try (EglContext gl = new EglContext(WIDTH, HEIGHT)) {
       cases(gl);
     }
-    Check.test("every type the dispatcher makes is opened alike by both openers", () -> {
-      final String text = "Tessel 7!";
-      final String pin = "739182";
-      final byte[] working = HexFormat.of().parseHex("3b1f6a0c9d2e4f5871a6c3e5d7092b4f");
-      final String[] keys68 = {"--master-key", Bank.hex(masterPinKey('1'), true), "--wrapped-working-key",
-        wrap(masterPinKey('1'), working), "--wrapped-pin-key", wrap(working, HexFormat.of().parseHex("C4D5E6F708192A3B4C5D6E7F80912233"))};
-      final String type68 = "1" + SEP + keys68[3] + SEP + keys68[5] + SEP + pin;
-      int opened = 0;
-      for (int type = 0; type <= 90; ++type) {
-        String input = type == 38 ? pin : type == 68 ? type68 : HASHED.contains(type) ? text + SEP + "pepper" + SEP + "S" : text;
-        String out = dispatch(type, JvmSuite.appModulusHex, JvmSuite.encModulusHex, input, TIMESTAMP);
-        Check.equal(NO_OUTPUT.contains(type), out == null, "type " + type + " makes an output");
-        if (out == null) continue;
-        Bank.Result r = Bank.open(type, out, true, keys68);  // both derive the PIN key
-        String expected = type == 38 || type == 68 ? pin
-            : type == 5 ? Bank.hex(Bank.digest("SHA-1", Bank.ascii(text)), true)
-            : HASHED.contains(type) ? Bank.saltedHash(text, "pepper", 'S') : text;
-        Check.equal(expected, r.get("content"), "content of type " + type + " " + r.stderr());
-        Check.isTrue(r.get("timestamp") == null || r.get("timestamp").equals(TIMESTAMP), "timestamp of type " + type);
-        if (r.exit() == 0 && expected.equals(r.get("content"))) ++opened;
-      }
-      Check.equal(91 - NO_OUTPUT.size(), opened, "types opened by both openers");
-      // A timestamp holding ':' is found by splitting a hex payload at its last ':'.
-      Opened o = JvmSuite.opener.open(10, dispatch(10, JvmSuite.appModulusHex, JvmSuite.encModulusHex, text, "12:00:00"));
-      Check.equal(text + "@12:00:00", new String(o.content(), "ISO-8859-1") + "@" + o.timestamp(), "timestamp with ':', library");
-      System.out.println("    " + opened + " encryption types opened by both openers");
-    });
+    CorpusTests.run();
   }
 
   private static void cases(EglContext gl) throws Exception {
@@ -144,39 +108,6 @@ final class OutputTests {
       Check.equal(TOUCH_DONE, k.doneKey(), "done");
       Check.equal(0, clearNativePlaintext(k.handle), "clear");
       expectTyped(k, "");
-      destroyNativeSession(k.handle);
-    });
-
-    Check.test("salted values of both outputs, each hash-random form, checked against the password", () -> {
-      JvmSuite.destroyAll();
-      KeyboardDriver k = keyboard(gl, "hash");
-      k.type("secret9");
-      Check.equal(1, setNativePublicKeyModulus(k.handle, JvmSuite.encModulusHex), "encryption key");
-      final String[][] forms = {{"1:pepper", "pepper", "S"}, {"2:salt:with:colons", "salt:with:colons", "F"}};
-      for (String[] f : forms) {
-        setNativeHashRandom(k.handle, f[0]);
-        final char mode = f[2].charAt(0);
-        Check.equal(Bank.saltedHash("secret9", f[1], mode), serverContent(k.handle), "type 48, " + f[0]);
-        Check.equal(Bank.saltedHash("secret9", f[1], mode), pinContent(k), "type 47, " + f[0]);
-        for (int type : new int[] {47, 48}) {
-          String out = type == 47 ? getNativePinContent(k.handle, TIMESTAMP) : getNativeContent(k.handle, TIMESTAMP);
-          Opened o = JvmSuite.opener.open(type, out);
-          Check.isTrue(PasswordCheck.matches(o, "secret9".toCharArray(), f[0]), "library: match, type " + type + " " + f[0]);
-          Check.isTrue(!PasswordCheck.matches(o, "secret8".toCharArray(), f[0]), "library: mismatch, type " + type);
-          Check.isTrue(!PasswordCheck.matches(o, "secret9".toCharArray(), (mode == 'S' ? "2:" : "1:") + f[1]), "library: other mode");
-          for (String pw : new String[] {"secret9", "secret8"}) {
-            Bank.Result r = Bank.open(type, out, type == 47, "--password", pw, "--salt", f[1], "--mode", f[2]);
-            Check.equal(pw.equals("secret9") ? 0 : 3, r.exit(), "openers' password check, type " + type + " " + pw);
-          }
-        }
-      }
-      // A type-48 envelope offered as type 47 without the encryption key: its payload is no RSA value.
-      String out48 = getNativeContent(k.handle, TIMESTAMP);
-      Check.equal("Rejected", javaRefusal(47, out48), "library refuses 48 as 47");
-      Check.equal(3, Bank.open(47, out48, false).exit(), "both openers refuse 48 as 47");
-      clearNativePlaintext(k.handle);
-      Check.equal(null, getNativeContent(k.handle, TIMESTAMP), "an empty password cannot be hashed");
-      Check.equal("The format of the text is wrong!", getNativeLastError(k.handle), "its error");
       destroyNativeSession(k.handle);
     });
 
