@@ -170,18 +170,21 @@ TEST(ServerCli, EveryForgeryGivesTheOneAnswer) {
       const bool b64 = t.payload.find_first_not_of("0123456789abcdef") != std::string::npos;
       const std::string forged = text(opensslRawEncrypt(directKey, block(directKey, fromHex("0001"), 3)));
       rows.push_back({"bad padding", b64 ? b64Of(forged) : hexOf(forged), {}});
+      const std::string above(directKey.size(), '\xff');  // not below the modulus
+      rows.push_back({"value above the modulus", b64 ? b64Of(above) : hexOf(above), {}});
     } else {
       rows.push_back({"bad padding", envelope(kRc4Key, badBlock), {}});
       rows.push_back({"wrong-length key", envelope(shortKey, pkcs1(appKey(), text(shortKey))), {}});
+      rows.push_back({"value above the modulus", envelope(kRc4Key, std::string(appKey().size(), '\xff')), {}});
       rows.push_back({"wrong 16-byte key", envelope(kRc4Key, pkcs1(appKey(), text(otherKey))), {}});
       rows.push_back({"wrong type", valid, {"--type", t.type == 10 ? "2" : "10"}});
     }
-    if (t.type != 88 && layout.inner != server::Inner::KeyouHex && layout.inner != server::Inner::KeyouBase64 &&
-        layout.inner != server::Inner::Pkcs1Hex && layout.inner != server::Inner::Pkcs1Base64)
-      rows.push_back({"wrong timestamp", valid, {"--timestamp", "2024-01-01 12:00:01"}});
+    const bool timestamped = layout.outer == server::Outer::WrappedEnvelope || t.type == 4 || t.type == 22;
+    if (timestamped) rows.push_back({"wrong timestamp", valid, {"--timestamp", "2024-01-01 12:00:01"}});
     for (const Row& r : rows) {
       std::vector<std::string> args = {"--type", std::to_string(t.type), "--key", app, "--enc-key", enc,
-                                       "--password", "hello", "--timestamp", kTs};
+                                       "--password", "hello"};
+      if (timestamped) args.insert(args.end(), {"--timestamp", kTs});
       if (t.salt) args.insert(args.end(), {"--salt", "pepper"});
       args.insert(args.end(), r.extra.begin(), r.extra.end());  // later options win
       args.push_back(r.output);
@@ -256,7 +259,7 @@ TEST(ServerCli, OpensEncryptedPinCodesAndReadsSecretsFromFiles) {
       {{"--challenge", "chal", "--password-file", big, code}, "", 2, ""},
       {{"--challenge", "chal", "--password-file", "/nonexistent", code}, "", 2, ""},
       {{"--challenge", "chal", code + "x"}, "", 1, ""},
-      {{"--challenge", "chal", "-"}, code + "\n" + std::string(65536, ' '), 1, ""},
+      {{"--challenge", "chal", "-"}, std::string(65537, 'A') + "\n", 1, ""},
   };
   for (const auto& r : rows) {
     const CliRun run = runOpenCli(r.args, r.input);

@@ -111,12 +111,12 @@ bool fromBase64(const std::string& text, std::string* out, const char* what, std
   return true;
 }
 
-bool readSecretFile(const std::string& path, std::size_t max, std::string* out, std::string* error) {
+bool readAtMost(const std::string& path, std::size_t limit, std::string* out, std::string* error) {
   wipeString(out);
   const int fd = path == "-" ? 0 : ::open(path.c_str(), O_RDONLY | O_CLOEXEC);
   if (fd < 0) return fail(error, "cannot read " + path);
-  // One buffer of max + 1 bytes, never grown (growing would leave a copy in freed heap).
-  out->assign(max + 1, '\0');
+  // One buffer, never grown (growing would leave a copy in freed heap).
+  out->assign(limit, '\0');
   std::size_t used = 0;
   bool ok = true;
   while (used < out->size()) {
@@ -127,13 +127,20 @@ bool readSecretFile(const std::string& path, std::size_t max, std::string* out, 
     used += static_cast<std::size_t>(n);
   }
   if (fd != 0) ::close(fd);
-  if (!ok || used > max) {
+  if (!ok) {
     wipeString(out);
-    return fail(error, ok ? path + " holds more than " + std::to_string(max) + " bytes" : "cannot read " + path);
+    return fail(error, "cannot read " + path);
   }
   OPENSSL_cleanse(&(*out)[used], out->size() - used);
   out->resize(used);
   return true;
+}
+
+bool readSecretFile(const std::string& path, std::size_t max, std::string* out, std::string* error) {
+  if (!readAtMost(path, max + 1, out, error)) return false;
+  if (out->size() <= max) return true;
+  wipeString(out);
+  return fail(error, path + " holds more than " + std::to_string(max) + " bytes");
 }
 
 namespace {

@@ -47,9 +47,10 @@ bool fromHex(const std::string& hex, std::string* out, const char* what, std::st
 // Empty text is refused. *out is wiped on failure.
 bool fromBase64(const std::string& text, std::string* out, const char* what, std::string* error);
 
-// Reads a whole file ("-": stdin) of at most `max` bytes into *out, through one buffer that is
-// wiped on every path (no stream copies left in freed heap). More than `max` bytes or an
-// unreadable file: false.
+// Reads at most `limit` bytes of a file ("-": stdin) into *out, through one buffer that is
+// wiped on every path (no stream copies left in freed heap). Unreadable: false.
+bool readAtMost(const std::string& path, std::size_t limit, std::string* out, std::string* error);
+// A whole file of at most `max` bytes (readAtMost max + 1); more: false.
 bool readSecretFile(const std::string& path, std::size_t max, std::string* out, std::string* error);
 
 // ---- constant time: masks are all ones (true) or all zeros (false); no branch on their values.

@@ -140,7 +140,6 @@ bool parse(int argc, char** argv, Options* o, std::string* error, bool* help) {
   if (!o->haveOutput) return fail(error, "no OUTPUT given (see --help)");
   for (Secret* s : secrets)
     if (!s->load(o->output == "-", error)) return false;
-  if (o->haveSalt && !o->password.given) return fail(error, "--salt needs --password");
   if (o->challenge.given && o->challenge.value.empty()) return fail(error, "the challenge code is empty");
   return true;
 }
@@ -158,12 +157,8 @@ void printOpened(const Opened& opened) {
 
 int run(Options& o) {
   std::string error;
-  if (o.output == "-") {
-    // At most 65536 bytes plus a final "\r\n" are read: a longer input is refused unread.
-    if (!readSecretFile("-", kMaxOutputBytes + 2, &o.output, &error))
-      return failLine(error.find("more than") != std::string::npos ? "output longer than 65536 bytes" : error,
-                      error.find("more than") != std::string::npos ? kOpenBadOutput : kOpenBadUsage);
-  }
+  // At most 65536 bytes and one more are read: the cap below refuses the rest unread.
+  if (o.output == "-" && !readAtMost("-", kMaxOutputBytes + 1, &o.output, &error)) return failLine(error, kOpenBadUsage);
   while (!o.output.empty() && (o.output.back() == '\n' || o.output.back() == '\r' || o.output.back() == ' '))
     o.output.pop_back();
 
@@ -186,6 +181,10 @@ int run(Options& o) {
     const TypeLayout layout = typeLayout(o.type);
     if (layout.outer == Outer::Unknown)
       return failLine("encryption type " + std::to_string(o.type) + " produces no output", kOpenBadUsage);
+    const bool timestamped = layout.outer == Outer::WrappedEnvelope || layout.inner == Inner::PairPkcs1Hex ||
+                             layout.inner == Inner::PairPkcs1Base64;
+    if (!o.timestamp.empty() && !timestamped)
+      return failLine("type " + std::to_string(o.type) + " carries no timestamp", kOpenBadUsage);
     if (layout.outer == Outer::DirectWithEnc ? o.encPath.empty() : o.keyPath.empty())
       return failLine(std::string("type ") + std::to_string(o.type) + " needs " +
                           (layout.outer == Outer::DirectWithEnc ? "--enc-key" : "--key") + " (see --help)",

@@ -105,11 +105,8 @@ bool PrivateKey::decryptRaw(const std::string& cipher, std::string* block, std::
                                    reinterpret_cast<const unsigned char*>(cipher.data()), cipher.size()) == 1 &&
                   n == cipher.size();
   EVP_PKEY_CTX_free(ctx);
-  // Raw RSA fails only for a value not below the modulus: public bytes.
-  if (!ok) {
-    wipeString(block);
-    return fail(error, "RSA value out of range for the key (foreign key?)");
-  }
+  // Raw RSA fails only for a value not below the modulus: it holds no message, like a forgery.
+  if (!ok) OPENSSL_cleanse(&(*block)[0], block->size());
   return true;
 }
 

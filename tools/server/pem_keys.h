@@ -43,8 +43,9 @@ class PrivateKey {
   std::string modulusHex() const;
   EVP_PKEY* get() const { return key_; }
 
-  // c^d mod n as exactly k bytes. False (a public-byte error) when no key is loaded, when the
-  // value is not k bytes or when it is not below the modulus.
+  // c^d mod n as exactly k bytes. False (a public-byte error) when no key is loaded or when the
+  // value is not k bytes. A value not below the modulus gives k zero bytes, which hold no
+  // message: it is rejected like any other forgery.
   bool decryptRaw(const std::string& cipher, std::string* block, std::string* error) const;
   // PKCS#1 v1.5 type 2 with implicit rejection (see above). expectedLength 0: any length.
   // False only for decryptRaw's public-byte errors; *message is then empty.

@@ -82,6 +82,8 @@ bool openEnvelope(const std::string& base64, const PrivateKey& key, std::size_t 
 
 bool splitWrapped(const std::string& content, Wrapped* out, std::string* error, bool atLastColon,
                   const std::string& expectedTimestamp) {
+  // The fields are cut whether or not the content is valid, so a forged content costs the same
+  // copies as a genuine one; only the returned answer differs.
   std::size_t colon = std::string::npos;
   if (!expectedTimestamp.empty()) {
     const std::size_t n = expectedTimestamp.size();
@@ -91,12 +93,13 @@ bool splitWrapped(const std::string& content, Wrapped* out, std::string* error, 
   } else if (content.size() >= 2) {
     colon = atLastColon ? content.rfind(':') : content.find(':', 1);
   }
-  if (colon == std::string::npos || colon == 0 || !validLetter(content[0])) return fail(error, kRejected);
-  out->strength = content[0];
-  out->timestamp.assign(content, 1, colon - 1);
+  const bool valid = colon != std::string::npos && colon != 0 && validLetter(content[0]);
+  const std::size_t cut = valid ? colon : std::min<std::size_t>(content.size(), 1);
+  out->strength = content.empty() ? 0 : content[0];
+  out->timestamp.assign(content, std::min<std::size_t>(content.size(), 1), cut > 0 ? cut - 1 : 0);
   wipeString(&out->payload);
-  out->payload.assign(content, colon + 1, std::string::npos);
-  return true;
+  out->payload.assign(content, std::min(content.size(), cut + 1), std::string::npos);
+  return valid || fail(error, kRejected);
 }
 
 Opened::~Opened() { clear(); }
@@ -159,8 +162,8 @@ bool openAny(int type, const std::string& output, const OpenKeys& keys, Opened* 
   // From here on every failure is the one answer.
   Wrapped parts;
   Wiped wp{parts.payload};
-  if (!splitWrapped(content, &parts, error, payloadIsEncoded(t.inner, keys.saltedHash), keys.expectedTimestamp))
-    return false;
+  const bool split =
+      splitWrapped(content, &parts, error, payloadIsEncoded(t.inner, keys.saltedHash), keys.expectedTimestamp);
   out->wrapped = true;
   out->strength = parts.strength;
   out->timestamp = parts.timestamp;
@@ -168,8 +171,9 @@ bool openAny(int type, const std::string& output, const OpenKeys& keys, Opened* 
   if (t.inner == Inner::Text || t.inner == Inner::Hashed) {
     out->content = out->payload;
     out->contentOpened = true;
-    return true;
+    return split;
   }
+  if (!split) return false;
   if (keys.enc == nullptr || (t.inner == Inner::Type68 && keys.pinKey.empty()))
     return checkSealedShape(t.inner, out->payload, error);  // stays sealed
   if (!openInner(t.inner, out->payload, *keys.enc, keys, out, error)) return fail(error, kRejected);
