@@ -25,7 +25,7 @@
 #include "pattern/strength.h"
 #include "render/surfaces.h"
 #include "road.h"
-#include "server/envelope.h"
+#include "server/password_check.h"
 #include "session/output.h"
 #include "session/session.h"
 #include "typist.h"
