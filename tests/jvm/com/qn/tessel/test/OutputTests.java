@@ -9,8 +9,6 @@ import static com.qn.tessel.test.JvmSuite.serverContent;
 
 import com.qn.tessel.server.EncryptedPinCode;
 import com.qn.tessel.server.OpenException;
-import com.qn.tessel.server.Opened;
-import com.qn.tessel.server.PasswordCheck;
 import com.qn.tessel.server.TesselOpener;
 import java.util.Base64;
 import java.util.HexFormat;
@@ -158,6 +156,8 @@ final class OutputTests {
       byte[] code = getNativeEncryptedPinCode(k.handle);
       Check.equal(Bank.encryptedPinCode(challenge, "0815 pin"), code, "code");
       Check.equal(Bank.ascii("0815 pin"), EncryptedPinCode.open(challenge, new String(code, "US-ASCII")), "opened by the library");
+      Check.equal("0815 pin", Bank.open(48, new String(code, "US-ASCII"), false, "--challenge", "challenge-4711").get("content"),
+          "opened alike by both command lines");
       Check.equal("No Error!", getNativeLastError(k.handle), "after a success");
       final byte[] high = {(byte) 0xC3, (byte) 0xA9, (byte) 0xFF, 0x7F};
       final byte[][][] challenges = {  // set, then the challenge in force: a zero byte ends one, bytes
