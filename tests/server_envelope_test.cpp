@@ -2,7 +2,10 @@
 // OpenSSL in the test: the one answer to every forgery, implicit rejection, the split rule,
 // strict base64, the input cap, secret files and the encrypted PIN code.
 #include <gtest/gtest.h>
+#include <openssl/bn.h>
+#include <openssl/core_names.h>
 #include <openssl/err.h>
+#include <openssl/hmac.h>
 
 #include <algorithm>
 #include <fstream>
@@ -91,6 +94,28 @@ TEST(ServerBytes, Base64IsStrict) {
   }
 }
 
+// The draft's synthetic message of n bytes, written here from its text with OpenSSL's HMAC:
+// KDK = HMAC(SHA-256(d), c); the last n bytes of HMAC(KDK, u16(i) "message" u16(8k)), i = 0, 1, ...
+std::string draftSynthetic(const server::PrivateKey& key, const std::string& cipher, std::size_t n) {
+  BIGNUM* d = nullptr;
+  EVP_PKEY_get_bn_param(key.get(), OSSL_PKEY_PARAM_RSA_D, &d);
+  Bytes dBytes(key.size());
+  BN_bn2binpad(d, dBytes.data(), static_cast<int>(dBytes.size()));
+  BN_free(d);
+  const Bytes dHash = opensslDigest("SHA256", dBytes);
+  unsigned char kdk[32], block[32];
+  unsigned int len = 0;
+  HMAC(EVP_sha256(), dHash.data(), 32, reinterpret_cast<const unsigned char*>(cipher.data()), cipher.size(), kdk, &len);
+  std::string prf;
+  const std::size_t bits = 8 * key.size();
+  for (unsigned i = 0; prf.size() < key.size(); ++i) {
+    const std::string in = std::string{char(i >> 8), char(i)} + "message" + std::string{char(bits >> 8), char(bits)};
+    HMAC(EVP_sha256(), kdk, 32, reinterpret_cast<const unsigned char*>(in.data()), in.size(), block, &len);
+    prf.append(reinterpret_cast<char*>(block), 32);
+  }
+  return prf.substr(key.size() - n);
+}
+
 // Implicit rejection against OpenSSL's explicit PKCS#1 decryption: where OpenSSL unpads, the
 // same message; where it refuses, the key's synthetic message, never a failure.
 TEST(ServerKeys, ImplicitRejectionAgreesWithOpenSslWhereItUnpads) {
@@ -122,9 +147,16 @@ TEST(ServerKeys, ImplicitRejectionAgreesWithOpenSslWhereItUnpads) {
     const std::string synthetic = key.syntheticMessage(cipher, r.expected);
     EXPECT_EQ(message, unpads ? oracle : synthetic) << r.head << " " << r.padding;
     if (r.expected == 0) { EXPECT_LT(synthetic.size(), key.size() - 10); }
+    if (r.expected == 16) { EXPECT_EQ(message, draftSynthetic(key, cipher, 16)); }
     ASSERT_TRUE(key.decryptPkcs1(cipher, r.expected, &again, &error));
     EXPECT_EQ(again, message) << "deterministic";
   }
+  // A value not below the modulus: rejected like a bad block, OpenSSL's complaint cleared.
+  const std::string above(key.size(), '\xff');
+  std::string message;
+  ASSERT_TRUE(key.decryptPkcs1(above, 16, &message, nullptr));
+  EXPECT_EQ(message, draftSynthetic(key, above, 16));
+  EXPECT_EQ(ERR_peek_error(), 0u);
 }
 
 // The one answer: every forged envelope of every RSA-bearing form, another type, another
