@@ -71,9 +71,11 @@ TEST(ServerEnvelope, PublicByteErrorsNameWhatIsWrong) {
       {edited([](Bytes& b) { b[8 + 140 + 2] = '-'; }), "8 digits"},
       {edited([](Bytes& b) { b.push_back('x'); }), "after its content"},
       {opensslEnvelope(encKey(), kRc4Key, 512, "S1:x"), "foreign"},
+      {std::string(65538, 'a'), "output longer than 65536 bytes"},  // as type 56, a bare RSA value
   };
   for (const auto& c : cases) {
-    const CliRun run = runOpenCli({"--key", dataPath("dispatch_app_key_1024.pem"), c.envelope});
+    const std::string type = c.envelope.size() == 65538 ? "56" : "48";
+    const CliRun run = runOpenCli({"--type", type, "--key", dataPath("dispatch_app_key_1024.pem"), c.envelope});
     EXPECT_EQ(run.status, 1) << c.expected;
     EXPECT_NE(run.err.find(c.expected), std::string::npos) << run.err;
     EXPECT_EQ(run.err.find('\n'), run.err.size() - 1) << run.err;
@@ -232,6 +234,10 @@ TEST(ServerCli, EveryForgeryGivesTheOneAnswer) {
       }
     }
   }
+  // Another type's content, its payload left sealed (no encryption key): the shape check answers.
+  const CliRun sealed = runOpenCli({"--type", "47", "--key", app, opensslEnvelope(appKey(), kRc4Key, 512, "S1:hello")});
+  EXPECT_EQ(sealed.status * 1000 + sealed.out.size(), 3000u) << sealed.err;
+  EXPECT_EQ(sealed.err, "tessel_open: output rejected\n");
 }
 
 // Without a timestamp: hex and base64 payloads split at the last ':', plain text at the first;
