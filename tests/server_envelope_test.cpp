@@ -2,7 +2,10 @@
 // OpenSSL in the test: the one answer to every forgery, implicit rejection, the split rule,
 // strict base64, the input cap, secret files and the encrypted PIN code.
 #include <gtest/gtest.h>
+#include <openssl/bn.h>
+#include <openssl/core_names.h>
 #include <openssl/err.h>
+#include <openssl/hmac.h>
 
 #include <algorithm>
 #include <fstream>
@@ -68,9 +71,11 @@ TEST(ServerEnvelope, PublicByteErrorsNameWhatIsWrong) {
       {edited([](Bytes& b) { b[8 + 140 + 2] = '-'; }), "8 digits"},
       {edited([](Bytes& b) { b.push_back('x'); }), "after its content"},
       {opensslEnvelope(encKey(), kRc4Key, 512, "S1:x"), "foreign"},
+      {std::string(65538, 'a'), "output longer than 65536 bytes"},  // as type 56, a bare RSA value
   };
   for (const auto& c : cases) {
-    const CliRun run = runOpenCli({"--key", dataPath("dispatch_app_key_1024.pem"), c.envelope});
+    const std::string type = c.envelope.size() == 65538 ? "56" : "48";
+    const CliRun run = runOpenCli({"--type", type, "--key", dataPath("dispatch_app_key_1024.pem"), c.envelope});
     EXPECT_EQ(run.status, 1) << c.expected;
     EXPECT_NE(run.err.find(c.expected), std::string::npos) << run.err;
     EXPECT_EQ(run.err.find('\n'), run.err.size() - 1) << run.err;
@@ -89,6 +94,28 @@ TEST(ServerBytes, Base64IsStrict) {
     std::string out;
     EXPECT_FALSE(server::fromBase64(bad, &out, "x", nullptr)) << bad;
   }
+}
+
+// The draft's synthetic message of n bytes, written here from its text with OpenSSL's HMAC:
+// KDK = HMAC(SHA-256(d), c); the last n bytes of HMAC(KDK, u16(i) "message" u16(8k)), i = 0, 1, ...
+std::string draftSynthetic(const server::PrivateKey& key, const std::string& cipher, std::size_t n) {
+  BIGNUM* d = nullptr;
+  EVP_PKEY_get_bn_param(key.get(), OSSL_PKEY_PARAM_RSA_D, &d);
+  Bytes dBytes(key.size());
+  BN_bn2binpad(d, dBytes.data(), static_cast<int>(dBytes.size()));
+  BN_free(d);
+  const Bytes dHash = opensslDigest("SHA256", dBytes);
+  unsigned char kdk[32], block[32];
+  unsigned int len = 0;
+  HMAC(EVP_sha256(), dHash.data(), 32, reinterpret_cast<const unsigned char*>(cipher.data()), cipher.size(), kdk, &len);
+  std::string prf;
+  const std::size_t bits = 8 * key.size();
+  for (unsigned i = 0; prf.size() < key.size(); ++i) {
+    const std::string in = std::string{char(i >> 8), char(i)} + "message" + std::string{char(bits >> 8), char(bits)};
+    HMAC(EVP_sha256(), kdk, 32, reinterpret_cast<const unsigned char*>(in.data()), in.size(), block, &len);
+    prf.append(reinterpret_cast<char*>(block), 32);
+  }
+  return prf.substr(key.size() - n);
 }
 
 // Implicit rejection against OpenSSL's explicit PKCS#1 decryption: where OpenSSL unpads, the
@@ -122,9 +149,16 @@ TEST(ServerKeys, ImplicitRejectionAgreesWithOpenSslWhereItUnpads) {
     const std::string synthetic = key.syntheticMessage(cipher, r.expected);
     EXPECT_EQ(message, unpads ? oracle : synthetic) << r.head << " " << r.padding;
     if (r.expected == 0) { EXPECT_LT(synthetic.size(), key.size() - 10); }
+    if (r.expected == 16) { EXPECT_EQ(message, draftSynthetic(key, cipher, 16)); }
     ASSERT_TRUE(key.decryptPkcs1(cipher, r.expected, &again, &error));
     EXPECT_EQ(again, message) << "deterministic";
   }
+  // A value not below the modulus: rejected like a bad block, OpenSSL's complaint cleared.
+  const std::string above(key.size(), '\xff');
+  std::string message;
+  ASSERT_TRUE(key.decryptPkcs1(above, 16, &message, nullptr));
+  EXPECT_EQ(message, draftSynthetic(key, above, 16));
+  EXPECT_EQ(ERR_peek_error(), 0u);
 }
 
 // The one answer: every forged envelope of every RSA-bearing form, another type, another
@@ -200,6 +234,10 @@ TEST(ServerCli, EveryForgeryGivesTheOneAnswer) {
       }
     }
   }
+  // Another type's content, its payload left sealed (no encryption key): the shape check answers.
+  const CliRun sealed = runOpenCli({"--type", "47", "--key", app, opensslEnvelope(appKey(), kRc4Key, 512, "S1:hello")});
+  EXPECT_EQ(sealed.status * 1000 + sealed.out.size(), 3000u) << sealed.err;
+  EXPECT_EQ(sealed.err, "tessel_open: output rejected\n");
 }
 
 // Without a timestamp: hex and base64 payloads split at the last ':', plain text at the first;

@@ -47,14 +47,16 @@ int hexValue(char c) {
   return -1;
 }
 
-int base64Value(char c) {
-  if (c >= 'A' && c <= 'Z') return c - 'A';
-  if (c >= 'a' && c <= 'z') return c - 'a' + 26;
-  if (c >= '0' && c <= '9') return c - '0' + 52;
-  if (c == '+') return 62;
-  if (c == '/') return 63;
-  return -1;
-}
+// Symbol values, 0xFF for bytes outside the alphabet: one lookup per symbol, no branch on it.
+struct Base64Table {
+  unsigned char value[256];
+  constexpr Base64Table() : value() {
+    for (int k = 0; k < 256; ++k) value[k] = 0xFF;
+    const char* alphabet = "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789+/";
+    for (int k = 0; k < 64; ++k) value[static_cast<unsigned char>(alphabet[k])] = static_cast<unsigned char>(k);
+  }
+};
+constexpr Base64Table kBase64;
 
 }  // namespace
 
@@ -80,21 +82,23 @@ bool fromBase64(const std::string& text, std::string* out, const char* what, std
   std::size_t pad = 0;
   if (n >= 2 && text[n - 1] == '=') pad = text[n - 2] == '=' ? 2 : 1;
   if (n % 4 != 0) return fail(error, std::string(what) + ": not valid base64 (corrupt or truncated)");
-  out->reserve(n / 4 * 3);
-  std::uint32_t group = 0;
+  out->assign((n - pad) * 3 / 4, '\0');
+  std::uint32_t group = 0, bad = 0;
+  std::size_t at = 0;
   for (std::size_t k = 0; k < n - pad; ++k) {
-    const int v = base64Value(text[k]);
-    if (v < 0) {
-      wipeString(out);
-      return fail(error, std::string(what) + ": not valid base64 (corrupt or truncated)");
-    }
-    group = (group << 6) | static_cast<std::uint32_t>(v);
+    const std::uint32_t v = kBase64.value[static_cast<unsigned char>(text[k])];
+    bad |= v & 0x40;
+    group = (group << 6) | (v & 0x3F);
     if (k % 4 == 3) {
-      out->push_back(static_cast<char>(group >> 16));
-      out->push_back(static_cast<char>(group >> 8));
-      out->push_back(static_cast<char>(group));
+      (*out)[at++] = static_cast<char>(group >> 16);
+      (*out)[at++] = static_cast<char>(group >> 8);
+      (*out)[at++] = static_cast<char>(group);
       group = 0;
     }
+  }
+  if (bad != 0) {
+    wipeString(out);
+    return fail(error, std::string(what) + ": not valid base64 (corrupt or truncated)");
   }
   // The last group: 2 symbols give 1 byte (4 unused bits), 3 symbols 2 bytes (2 unused bits).
   const std::uint32_t unused = pad == 2 ? (group & 0xF) : pad == 1 ? (group & 0x3) : 0;
@@ -102,10 +106,10 @@ bool fromBase64(const std::string& text, std::string* out, const char* what, std
     wipeString(out);
     return fail(error, std::string(what) + ": not valid base64 (not canonical)");
   }
-  if (pad == 2) out->push_back(static_cast<char>(group >> 4));
+  if (pad == 2) (*out)[at] = static_cast<char>(group >> 4);
   if (pad == 1) {
-    out->push_back(static_cast<char>(group >> 10));
-    out->push_back(static_cast<char>(group >> 2));
+    (*out)[at] = static_cast<char>(group >> 10);
+    (*out)[at + 1] = static_cast<char>(group >> 2);
   }
   group = 0;
   return true;

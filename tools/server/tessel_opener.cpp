@@ -96,8 +96,11 @@ bool splitWrapped(const std::string& content, Wrapped* out, std::string* error, 
   const bool valid = colon != std::string::npos && colon != 0 && validLetter(content[0]);
   const std::size_t cut = valid ? colon : std::min<std::size_t>(content.size(), 1);
   out->strength = content.empty() ? 0 : content[0];
-  out->timestamp.assign(content, std::min<std::size_t>(content.size(), 1), cut > 0 ? cut - 1 : 0);
+  // Room for the whole content in both fields: the allocations do not depend on where ':' is.
   wipeString(&out->payload);
+  out->timestamp.reserve(content.size());
+  out->payload.reserve(content.size());
+  out->timestamp.assign(content, std::min<std::size_t>(content.size(), 1), cut > 0 ? cut - 1 : 0);
   out->payload.assign(content, std::min(content.size(), cut + 1), std::string::npos);
   return valid || fail(error, kRejected);
 }
@@ -166,9 +169,12 @@ bool openAny(int type, const std::string& output, const OpenKeys& keys, Opened* 
       splitWrapped(content, &parts, error, payloadIsEncoded(t.inner, keys.saltedHash), keys.expectedTimestamp);
   out->wrapped = true;
   out->strength = parts.strength;
+  out->timestamp.reserve(content.size());
+  out->payload.reserve(content.size());
   out->timestamp = parts.timestamp;
   out->payload = parts.payload;
   if (t.inner == Inner::Text || t.inner == Inner::Hashed) {
+    out->content.reserve(content.size());
     out->content = out->payload;
     out->contentOpened = true;
     return split;
