@@ -28,7 +28,7 @@ public final class TimingBench {
   private TimingBench() {}
 
   private static final String[] NAMES = {"valid", "bad_padding", "wrong_length_key", "wrong_16_byte_key"};
-  private static final int PER_CLASS = 8;
+  private static final int PER_CLASS = 256;
   private static final int WARM_UP = 3000;
 
   /** 00 02 | non-zero filler | 00 | message, or 00 01 ... for a bad block type. */
