@@ -274,7 +274,7 @@ public final class TesselOpener {
         : options.expectedTimestamp().getBytes(StandardCharsets.ISO_8859_1);
     if (expected != null && !t.hasTimestamp()) throw new IllegalArgumentException("type " + type + " carries no timestamp");
     final byte[] text = capped(output);
-    return switch (t.outer()) {
+    final Opened opened = switch (t.outer()) {
       case DIRECT_ENC, DIRECT_APP -> {
         final Rsa key = t.outer() == Types.Outer.DIRECT_ENC ? need(enc, type, "encryption") : need(app, type, "application");
         Payloads.Result r = Payloads.open(new Payloads.Request(t.inner(), text, key, pinKey, expected, true));
@@ -282,6 +282,8 @@ public final class TesselOpener {
       }
       default -> openEnvelope(type, t, text, expected, options.saltedHash());
     };
+    if (opened == null) throw new OpenException.Rejected();  // the one place, one frame from the caller
+    return opened;
   }
 
   private Opened openEnvelope(int type, Types.Kind t, byte[] text, byte[] expected, boolean saltedHash)
@@ -353,12 +355,12 @@ public final class TesselOpener {
     return accept(ok, new Opened(type, strength, timestamp, payload, r.content()), r.timestamp());
   }
 
-  /** The one place a rejection is thrown: wipes what was opened first. */
-  private static Opened accept(int valid, Opened opened, byte[] scratch) throws OpenException.Rejected {
+  /** The opened fields, or null (wiped) when a check failed: {@link #open} then rejects. */
+  private static Opened accept(int valid, Opened opened, byte[] scratch) {
     Bytes.wipe(scratch);
     if (valid == 0) {
       opened.close();
-      throw new OpenException.Rejected();
+      return null;
     }
     return opened;
   }
