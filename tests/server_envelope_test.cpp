@@ -265,6 +265,21 @@ TEST(ServerPayloads, SplitRule) {
   }
 }
 
+// Length-prefixed pairs: "%02d" is two digits below 100 and three from 100 on.
+TEST(ServerPayloads, LengthPrefixedPairs) {
+  const struct {
+    std::string pair, fields;  // "" : rejected
+  } rows[] = {
+      {"041700041234", "1700|1234"}, {"0000", "|"}, {"02ab100" + std::string(100, 't'), "ab|" + std::string(100, 't')},
+      {"0417000510pw", ""}, {"041700021", ""}, {"0417000212345", ""}, {"x", ""},
+  };
+  for (const auto& r : rows) {
+    std::string ts, text, error;
+    const bool ok = server::parseLengthPrefixedPair(r.pair, &ts, &text, &error);
+    EXPECT_EQ(ok ? ts + "|" + text : error, r.fields.empty() ? "output rejected" : r.fields) << r.pair;
+  }
+}
+
 TEST(ServerPayloads, SaltedHashesKnownAnswers) {
   // Values computed with Python's hashlib: md5(md5(p).hexdigest() + salt).hexdigest().
   EXPECT_EQ(server::saltedHashValue("pw", "salt", 'S'), "c359e5975c5a3f45");
