@@ -11,7 +11,7 @@
 #include <string>
 
 #include "output/dispatcher.h"
-#include "server/envelope.h"
+#include "server/tessel_opener.h"
 
 namespace {
 

@@ -7,7 +7,7 @@
 #include <string>
 #include <tuple>
 
-#include "server/envelope.h"
+#include "server/tessel_opener.h"
 #include "session/output.h"
 #include "session/session.h"
 #include "session/settings.h"

@@ -11,7 +11,8 @@
 #include "output/dispatch_payloads.h"
 #include "output/dispatcher.h"
 #include "crypto/random.h"
-#include "server/envelope.h"
+#include "server/payloads.h"
+#include "server/tessel_opener.h"
 #include "support/dispatch_oracle.h"
 
 namespace tessel::test {

@@ -13,6 +13,7 @@
 #include <cstdlib>
 #include <cstring>
 #include <functional>
+#include <memory>
 #include <string>
 #include <vector>
 
@@ -22,6 +23,7 @@
 #include "session/output.h"
 #include "session/session.h"
 #include "session/settings.h"
+#include "server/password_check.h"
 #include "support/dispatch_oracle.h"
 #include "support/keyboard_typist.h"
 
@@ -318,6 +320,26 @@ TEST_F(Hygiene, TypedPasswordNeverReachesFreedHeap) {
     destroySession(handle);
   }
   EXPECT_EQ(sessionAt(handle), nullptr);
+}
+
+// The server side: loading a key file and opening a type-48 output that carries the password
+// itself leave neither the key's PEM text nor the password in freed heap.
+TEST_F(Hygiene, ServerOpenerLeavesNoKeyOrPasswordInFreedHeap) {
+  static const char kPemLine[] = "gxnc2cB1SAB/WC7vgINLjh4dqLjqgdaeKLRpvzWrbtZOU7tk";  // from the key's body
+  addNeedle("PEM text of the private key", kPemLine, sizeof kPemLine - 1);
+  const std::string output = opensslEnvelope(appKey(), Bytes(16, 7), 512, std::string("S1700000000:") + kPassword);
+  ScanScope scan("tessel_server: loadPemFile, openOutput, matchesPassword, ~Opened");
+  server::PrivateKey key;
+  std::string error;
+  ASSERT_TRUE(key.loadPemFile(dataPath("dispatch_app_key_1024.pem"), &error)) << error;
+  server::OpenKeys keys;
+  keys.app = &key;
+  keys.expectedTimestamp = "1700000000";
+  auto opened = std::make_unique<server::Opened>();
+  ASSERT_TRUE(server::openOutput(48, output, keys, opened.get(), &error)) << error;
+  EXPECT_TRUE(server::matchesPassword(48, *opened, kPassword, "", 'S'));
+  opened.reset();
+  EXPECT_GT(scan.scanned(), 0);
 }
 
 }  // namespace

@@ -1,37 +1,55 @@
 // The server-side opener (tools/server) on its own, against envelopes and RSA values built with
-// OpenSSL in the test: layout, key unwrap, keystream drops, payload layouts, salted hashes, and
-// refusal of corrupt, truncated and foreign input by the library and the tessel_open command.
+// OpenSSL in the test: the one answer to every forgery, implicit rejection, the split rule,
+// strict base64, the input cap, secret files and the encrypted PIN code.
 #include <gtest/gtest.h>
+#include <openssl/bn.h>
+#include <openssl/core_names.h>
+#include <openssl/err.h>
+#include <openssl/hmac.h>
 
 #include <algorithm>
+#include <fstream>
 #include <functional>
 #include <string>
 #include <vector>
 
-#include "server/envelope.h"
+#include "server/bytes.h"
+#include "server/encrypted_pin_code.h"
+#include "server/password_check.h"
+#include "server/payloads.h"
 #include "support/dispatch_oracle.h"
 
 namespace tessel::test {
 namespace {
 
 const Bytes kRc4Key = fromHex("00112233445566778899aabbccddeeff");
+const std::string kTs = "2024-01-01 12:00:00";
+
+std::string text(const Bytes& b) { return std::string(b.begin(), b.end()); }
+// A raw block of k bytes: `head` then `fill`.
+Bytes block(const server::PrivateKey& key, const Bytes& head, std::uint8_t fill = 0x5a) {
+  Bytes b = head;
+  b.resize(key.size(), fill);
+  return b;
+}
+std::string keyou(const server::PrivateKey& key) { return text(opensslRawEncrypt(key, block(key, bytesOf("05hello")))); }
+std::string pkcs1(const server::PrivateKey& key, const std::string& m) { return text(opensslPkcs1Encrypt(key, bytesOf(m))); }
+std::string hexOf(const std::string& s) { return toHex(bytesOf(s)); }
+std::string b64Of(const std::string& s) { return opensslBase64(bytesOf(s)); }
+const std::string kPair = "19" + kTs + "05hello";
 
 TEST(ServerEnvelope, OpensOpenSslEnvelopesAtEachDrop) {
-  for (const auto& [drop, content] : {std::pair{std::size_t{512}, std::string("S20240101:secret text")},
-                                      {std::size_t{625}, std::string("S20240101:secret text")},
-                                      {std::size_t{768}, std::string("S20240101:secret text")},
-                                      {std::size_t{512}, std::string()}}) {
-    const std::string envelope = opensslEnvelope(appKey(), kRc4Key, drop, content);
-    std::string opened = "x", error;
-    ASSERT_TRUE(server::openEnvelope(envelope, appKey(), drop, &opened, &error)) << error;
-    EXPECT_EQ(opened, content) << "drop " << drop;
+  for (std::size_t drop : {512, 625, 768}) {
+    std::string opened, error;
+    ASSERT_TRUE(server::openEnvelope(opensslEnvelope(appKey(), kRc4Key, drop, "S1:x"), appKey(), drop, &opened, &error));
+    EXPECT_EQ(opened, "S1:x") << drop;
   }
   const CliRun run = runOpenCli({"--layout", opensslEnvelope(appKey(), kRc4Key, 512, "0123456789")});
   EXPECT_EQ(run.out + run.err, "key-blob-length: 140\nrsa-length: 128\ncontent-length: 10\ntotal-length: 166\n");
 }
 
-// Each bad envelope must be refused with one line that names what is wrong.
-TEST(ServerEnvelope, RefusesCorruptTruncatedAndForeignEnvelopes) {
+// Public bytes wrong: each keeps its own one-line message, exit 1, no private-key operation.
+TEST(ServerEnvelope, PublicByteErrorsNameWhatIsWrong) {
   const std::string good = opensslEnvelope(appKey(), kRc4Key, 512, "S1700000000:hello");
   auto edited = [&](const std::function<void(Bytes&)>& edit) {
     Bytes copy = opensslBase64Decode(good);
@@ -39,170 +57,267 @@ TEST(ServerEnvelope, RefusesCorruptTruncatedAndForeignEnvelopes) {
     return opensslBase64(copy);
   };
   const struct {
-    const char* name;
     std::string envelope;
-    const server::PrivateKey* key;
     const char* expected;  // part of the message
   } cases[] = {
-      {"empty", "", &appKey(), "empty"},
-      {"cut inside a base64 group", good.substr(0, good.size() - 1), &appKey(), "base64"},
-      {"cut inside the wrapped key", edited([](Bytes& b) { b.resize(60); }), &appKey(), "truncated"},
-      {"header only", edited([](Bytes& b) { b.resize(12); }), &appKey(), "truncated"},
-      {"key length too small", edited([](Bytes& b) { std::fill(b.begin(), b.begin() + 8, '0'); }), &appKey(),
-       "too small"},
-      {"not a SIMPLEBLOB", edited([](Bytes& b) { b[13] = 0x66; }), &appKey(), "SIMPLEBLOB"},
-      {"letter in the content length", edited([](Bytes& b) { b[8 + 140 + 2] = '-'; }), &appKey(), "8 digits"},
-      {"content length too long", edited([](Bytes& b) { b[8 + 140 + 6] = '9'; }), &appKey(), "truncated"},
-      {"wrapped key damaged", edited([](Bytes& b) { b[100] ^= 0x40; }), &appKey(), "unwrap"},
-      {"foreign key of another size", good, &encKey(), "foreign"},
+      {"", "empty"},
+      {good.substr(0, good.size() - 1), "base64"},
+      {good + "-ANYTHING<script>", "base64"},
+      {good.substr(0, 8) + "\n" + good.substr(8, good.size() - 9), "base64"},
+      {std::string(65537, 'A'), "output longer than 65536 bytes"},
+      {edited([](Bytes& b) { b.resize(60); }), "truncated"},
+      {edited([](Bytes& b) { std::fill(b.begin(), b.begin() + 8, '0'); }), "too small"},
+      {edited([](Bytes& b) { b[13] = 0x66; }), "SIMPLEBLOB"},
+      {edited([](Bytes& b) { b[8 + 140 + 2] = '-'; }), "8 digits"},
+      {edited([](Bytes& b) { b.push_back('x'); }), "after its content"},
+      {opensslEnvelope(encKey(), kRc4Key, 512, "S1:x"), "foreign"},
+      {std::string(65538, 'a'), "output longer than 65536 bytes"},  // as type 56, a bare RSA value
   };
   for (const auto& c : cases) {
-    std::string opened, error;
-    EXPECT_FALSE(server::openEnvelope(c.envelope, *c.key, 512, &opened, &error)) << c.name;
-    EXPECT_NE(error.find(c.expected), std::string::npos) << c.name << ": " << error;
-    EXPECT_EQ(error.find('\n'), std::string::npos) << c.name;
-    EXPECT_EQ(error.find("hello"), std::string::npos) << c.name << ": message leaks content";
+    const std::string type = c.envelope.size() == 65538 ? "56" : "48";
+    const CliRun run = runOpenCli({"--type", type, "--key", dataPath("dispatch_app_key_1024.pem"), c.envelope});
+    EXPECT_EQ(run.status, 1) << c.expected;
+    EXPECT_NE(run.err.find(c.expected), std::string::npos) << run.err;
+    EXPECT_EQ(run.err.find('\n'), run.err.size() - 1) << run.err;
   }
 }
 
-TEST(ServerPayloads, WrapperKeyouBlocksAndLengthPrefixedPairs) {
-  // Each row: the text, whether it parses, and the fields it gives ("|" between two fields).
-  const std::string filler(20, '\x5a');
+// Strict base64: exactly the canonical standard form, checked against OpenSSL's encoder.
+TEST(ServerBytes, Base64IsStrict) {
+  for (std::size_t n = 1; n <= 7; ++n) {
+    const Bytes data(n, static_cast<std::uint8_t>(0xA5 + n));
+    std::string out, error;
+    ASSERT_TRUE(server::fromBase64(opensslBase64(data), &out, "x", &error)) << error;
+    EXPECT_EQ(out, text(data));
+  }
+  for (const char* bad : {"", "QQ", "QQ=", "QR==", "QUI=x", "QU=I", "Q===", "QUJD\n", " QUJD", "QUJ-", "QUJD===="}) {
+    std::string out;
+    EXPECT_FALSE(server::fromBase64(bad, &out, "x", nullptr)) << bad;
+  }
+}
+
+// The draft's synthetic message of n bytes, written here from its text with OpenSSL's HMAC:
+// KDK = HMAC(SHA-256(d), c); the last n bytes of HMAC(KDK, u16(i) "message" u16(8k)), i = 0, 1, ...
+std::string draftSynthetic(const server::PrivateKey& key, const std::string& cipher, std::size_t n) {
+  BIGNUM* d = nullptr;
+  EVP_PKEY_get_bn_param(key.get(), OSSL_PKEY_PARAM_RSA_D, &d);
+  Bytes dBytes(key.size());
+  BN_bn2binpad(d, dBytes.data(), static_cast<int>(dBytes.size()));
+  BN_free(d);
+  const Bytes dHash = opensslDigest("SHA256", dBytes);
+  unsigned char kdk[32], block[32];
+  unsigned int len = 0;
+  HMAC(EVP_sha256(), dHash.data(), 32, reinterpret_cast<const unsigned char*>(cipher.data()), cipher.size(), kdk, &len);
+  std::string prf;
+  const std::size_t bits = 8 * key.size();
+  for (unsigned i = 0; prf.size() < key.size(); ++i) {
+    const std::string in = std::string{char(i >> 8), char(i)} + "message" + std::string{char(bits >> 8), char(bits)};
+    HMAC(EVP_sha256(), kdk, 32, reinterpret_cast<const unsigned char*>(in.data()), in.size(), block, &len);
+    prf.append(reinterpret_cast<char*>(block), 32);
+  }
+  return prf.substr(key.size() - n);
+}
+
+// Implicit rejection against OpenSSL's explicit PKCS#1 decryption: where OpenSSL unpads, the
+// same message; where it refuses, the key's synthetic message, never a failure.
+TEST(ServerKeys, ImplicitRejectionAgreesWithOpenSslWhereItUnpads) {
+  const server::PrivateKey& key = appKey();
   const struct {
-    char kind;  // W wrapper (L: split at the last ':'), K Keyou block, P length-prefixed pair
-    std::string in;
-    bool ok;
-    std::string fields;
-  } cases[] = {
-      {'W', "S1700000000:pay:load", true, "S|1700000000|pay:load"},
-      {'W', "", false, ""}, {'W', "S123", false, ""}, {'W', "X123:abc", false, ""},
-      {'L', "S2024-01-01 12:00:00:0A1B", true, "S|2024-01-01 12:00:00|0A1B"},
-      {'L', "S123", false, ""}, {'L', ":123", false, ""},
-      {'K', "05hello" + filler, true, "hello"},
-      {'K', "00" + filler, false, ""}, {'K', "99abc", false, ""}, {'K', "a5hello", false, ""},
-      {'K', ":0" + std::string(100, 'm') + "zz", true, std::string(100, 'm')},  // 100 runs past '9'
-      {'P', "041700041234", true, "1700|1234"},
-      {'P', "0000", true, "|"},
-      {'P', "10170000000005hello", true, "1700000000|hello"},
-      {'P', "02ab" "100" + std::string(100, 't'), true, "ab|" + std::string(100, 't')},
-      {'P', "0417000510pw", false, ""}, {'P', "041700021", false, ""}, {'P', "0417000212345", false, ""},
-      {'P', "x", false, ""},
+    const char* head;
+    std::size_t padding;   // bytes of 07 before the 00 separator (none when it fills the block)
+    std::size_t expected;  // length asked for; 0 any
+  } rows[] = {
+      {"0002", 9, 0}, {"0002", 8, 117}, {"0002", 7, 0} /* padding too short */, {"0001", 9, 0} /* type 1 */,
+      {"0102", 9, 0}, {"0002", 126, 0} /* no separator */, {"0002", 110, 16} /* 15 bytes */,
+      {"0002", 108, 16} /* 17 bytes */,
   };
-  for (const auto& c : cases) {
-    std::string a, b, error, fields;
-    server::Wrapped w;
-    bool ok = false;
-    if (c.kind == 'W' || c.kind == 'L') {
-      ok = server::splitWrapped(c.in, &w, &error, c.kind == 'L');
-      fields = std::string(1, w.strength) + "|" + w.timestamp + "|" + w.payload;
-    } else if (c.kind == 'K') {
-      ok = server::parseKeyouBlock(c.in, &a, &error);
-      fields = a;
-    } else {
-      ok = server::parseLengthPrefixedPair(c.in, &a, &b, &error);
-      fields = a + "|" + b;
+  for (const auto& r : rows) {
+    Bytes plain = fromHex(r.head);
+    plain.resize(2 + r.padding, 7);
+    plain.push_back(0);
+    const std::string cipher = text(opensslRawEncrypt(key, block(key, plain, 0x41)));
+    std::string message, again, error;
+    ASSERT_TRUE(key.decryptPkcs1(cipher, r.expected, &message, &error)) << error;
+    EXPECT_EQ(ERR_peek_error(), 0u);
+    std::string oracle;
+    try {
+      oracle = text(opensslPkcs1Decrypt(key, bytesOf(cipher)));
+    } catch (const std::exception&) {
+      oracle = "refused";
     }
-    EXPECT_EQ(ok, c.ok) << c.kind << " " << c.in;
-    if (c.ok) { EXPECT_EQ(fields, c.fields) << c.kind << " " << c.in; }
+    const bool unpads = oracle != "refused" && (r.expected == 0 || oracle.size() == r.expected);
+    const std::string synthetic = key.syntheticMessage(cipher, r.expected);
+    EXPECT_EQ(message, unpads ? oracle : synthetic) << r.head << " " << r.padding;
+    if (r.expected == 0) { EXPECT_LT(synthetic.size(), key.size() - 10); }
+    if (r.expected == 16) { EXPECT_EQ(message, draftSynthetic(key, cipher, 16)); }
+    ASSERT_TRUE(key.decryptPkcs1(cipher, r.expected, &again, &error));
+    EXPECT_EQ(again, message) << "deterministic";
   }
+  // A value not below the modulus: rejected like a bad block, OpenSSL's complaint cleared.
+  const std::string above(key.size(), '\xff');
+  std::string message;
+  ASSERT_TRUE(key.decryptPkcs1(above, 16, &message, nullptr));
+  EXPECT_EQ(message, draftSynthetic(key, above, 16));
+  EXPECT_EQ(ERR_peek_error(), 0u);
 }
 
-TEST(ServerPayloads, SaltedHashesAndPasswordMatching) {
-  // Values computed with Python's hashlib: md5(md5(p).hexdigest() + salt).hexdigest().
-  const struct {
-    const char *password, *salt;
-    char mode;
-    const char* value;
-  } hashes[] = {
-      {"pw", "salt", 'S', "c359e5975c5a3f45"},
-      {"pw", "salt", 'F', "38b311d8c359e5975c5a3f454d3f4294"},
-      {"123456", "a1b2c3", 'S', "f8bbb18037919adc"},
-      {"Passw0rd!", "::x::", 'F', "f061fc492d56eb9b8e2dfe6bdd59f73c"},
-      {"pw", "salt", 'X', ""},
-  };
-  for (const auto& c : hashes) EXPECT_EQ(server::saltedHashValue(c.password, c.salt, c.mode), c.value) << c.password;
+// The one answer: every forged envelope of every RSA-bearing form, another type, another
+// timestamp and a wrong password give the same status, the same line and nothing on stdout.
+TEST(ServerCli, EveryForgeryGivesTheOneAnswer) {
+  const std::string app = dataPath("dispatch_app_key_1024.pem"), enc = dataPath("dispatch_enc_key_2048.pem");
+  const std::string salted = server::saltedHashValue("hello", "pepper", 'S');
+  std::string sha1 = toHex(opensslSha1("hello"));
+  std::transform(sha1.begin(), sha1.end(), sha1.begin(), ::toupper);
+  std::string type5 = pkcs1(encKey(), sha1);
+  std::reverse(type5.begin(), type5.end());
   const struct {
     int type;
-    std::string content, password, salt;
-    char mode;
-    bool match;
-  } matches[] = {
-      {47, "c359e5975c5a3f45", "pw", "salt", 'S', true},
-      {48, "38b311d8c359e5975c5a3f454d3f4294", "pw", "salt", 'F', true},
-      {48, "38b311d8c359e5975c5a3f454d3f4294", "pw", "salt", 'S', false},
-      {59, "pw", "pw", "", 'S', true},  // no hash random set: the password itself
-      // SHA-1("abc"), FIPS 180-4 example
-      {5, "A9993E364706816ABA3E25717850C26C9CD0D89D", "abc", "", 'S', true},
-      {5, "A9993E364706816ABA3E25717850C26C9CD0D89D", "abd", "", 'S', false},
-      {0, "hello", "hello", "", 'S', true},
-      {0, "hello", "hello!", "", 'S', false},
-      {0, "", "", "", 'S', true},
+    std::string payload;  // after "S" kTs ":" (88: the whole content; direct types: the output)
+    bool salt = false;
+  } types[] = {
+      {0, "hello"}, {1, "hello"}, {48, "hello"}, {48, salted, true}, {88, "hello"},
+      {47, hexOf(pkcs1(encKey(), salted)), true}, {2, hexOf(keyou(encKey()))}, {12, b64Of(keyou(encKey()))},
+      {10, hexOf(pkcs1(encKey(), "hello"))}, {8, hexOf(pkcs1(encKey(), kPair))}, {46, b64Of(pkcs1(encKey(), kPair))},
+      {5, hexOf(type5) + "0001"}, {19, hexOf(pkcs1(encKey(), "01105hello"))},
+      {30, hexOf(pkcs1(encKey(), "hello"))}, {22, hexOf(pkcs1(encKey(), kPair))}, {4, b64Of(pkcs1(encKey(), kPair))},
+      {29, hexOf(keyou(encKey()))}, {3, b64Of(keyou(encKey()))}, {56, hexOf(pkcs1(appKey(), "hello"))},
+      {73, b64Of(pkcs1(appKey(), "hello"))},
   };
-  server::Opened opened;
-  opened.contentOpened = true;
-  for (const auto& c : matches) {
-    opened.content = c.content;
-    EXPECT_EQ(server::matchesPassword(c.type, opened, c.password, c.salt, c.mode), c.match)
-        << c.type << " " << c.password;
+  const std::string badBlock = text(opensslRawEncrypt(appKey(), block(appKey(), fromHex("0001"), 3)));
+  const Bytes otherKey = fromHex("ffeeddccbbaa99887766554433221100"), shortKey(kRc4Key.begin(), kRc4Key.end() - 1);
+  for (const auto& t : types) {
+    const server::TypeLayout layout = server::typeLayout(t.type);
+    const bool direct = layout.outer == server::Outer::DirectWithEnc || layout.outer == server::Outer::DirectWithApp;
+    const server::PrivateKey& directKey = layout.outer == server::Outer::DirectWithApp ? appKey() : encKey();
+    const std::string content = t.type == 88 ? t.payload : "S" + kTs + ":" + t.payload;
+    auto envelope = [&](const Bytes& key, const std::string& wrapped) {
+      return opensslEnvelope(appKey(), key, layout.drop, content, bytesOf(wrapped));
+    };
+    const std::string valid = direct ? t.payload : envelope(kRc4Key, pkcs1(appKey(), text(kRc4Key)));
+    struct Row {
+      const char* what;
+      std::string output;
+      std::vector<std::string> extra;
+    };
+    std::vector<Row> rows = {{"valid", valid, {}}, {"wrong password", valid, {"--password", "hellO"}}};
+    if (direct) {
+      const bool b64 = t.payload.find_first_not_of("0123456789abcdef") != std::string::npos;
+      const std::string forged = text(opensslRawEncrypt(directKey, block(directKey, fromHex("0001"), 3)));
+      rows.push_back({"bad padding", b64 ? b64Of(forged) : hexOf(forged), {}});
+      const std::string above(directKey.size(), '\xff');  // not below the modulus
+      rows.push_back({"value above the modulus", b64 ? b64Of(above) : hexOf(above), {}});
+    } else {
+      rows.push_back({"bad padding", envelope(kRc4Key, badBlock), {}});
+      rows.push_back({"wrong-length key", envelope(shortKey, pkcs1(appKey(), text(shortKey))), {}});
+      rows.push_back({"value above the modulus", envelope(kRc4Key, std::string(appKey().size(), '\xff')), {}});
+      rows.push_back({"wrong 16-byte key", envelope(kRc4Key, pkcs1(appKey(), text(otherKey))), {}});
+      rows.push_back({"wrong type", valid, {"--type", t.type == 10 ? "2" : "10"}});
+    }
+    const bool timestamped = layout.outer == server::Outer::WrappedEnvelope || t.type == 4 || t.type == 22;
+    if (timestamped) rows.push_back({"wrong timestamp", valid, {"--timestamp", "2024-01-01 12:00:01"}});
+    for (const Row& r : rows) {
+      std::vector<std::string> args = {"--type", std::to_string(t.type), "--key", app, "--enc-key", enc,
+                                       "--password", "hello"};
+      if (timestamped) args.insert(args.end(), {"--timestamp", kTs});
+      if (t.salt) args.insert(args.end(), {"--salt", "pepper"});
+      args.insert(args.end(), r.extra.begin(), r.extra.end());  // later options win
+      args.push_back(r.output);
+      const CliRun run = runOpenCli(args);
+      const std::string where = std::to_string(t.type) + ", " + r.what;
+      if (std::string(r.what) == "valid") {
+        EXPECT_EQ(run.status, 0) << where << ": " << run.err;
+        EXPECT_NE(run.out.find("content: "), std::string::npos) << where;
+        EXPECT_NE(run.out.find("password: match\n"), std::string::npos) << where;
+      } else {
+        EXPECT_EQ(run.status, 3) << where << ": " << run.err;
+        EXPECT_EQ(run.out + run.err, "tessel_open: output rejected\n") << where;
+      }
+    }
   }
-  opened.contentOpened = false;
-  EXPECT_FALSE(server::matchesPassword(0, opened, "hello", "", 'S'));
+  // Another type's content, its payload left sealed (no encryption key): the shape check answers.
+  const CliRun sealed = runOpenCli({"--type", "47", "--key", app, opensslEnvelope(appKey(), kRc4Key, 512, "S1:hello")});
+  EXPECT_EQ(sealed.status * 1000 + sealed.out.size(), 3000u) << sealed.err;
+  EXPECT_EQ(sealed.err, "tessel_open: output rejected\n");
 }
 
-TEST(ServerPayloads, RsaLayoutsAndPinKeyDerivationAgainstOpenSsl) {
-  std::string plain, error;
-  const Bytes cipher = opensslPkcs1Encrypt(encKey(), bytesOf("hello"));
-  Bytes block = bytesOf("05hello");
-  block.resize(encKey().size(), 0x33);
-  const Bytes keyou = opensslRawEncrypt(encKey(), block);
-  using Opener = bool (*)(const server::PrivateKey&, const std::string&, std::string*, std::string*);
-  for (const auto& [opener, text] : {std::pair<Opener, std::string>{server::openPkcs1Hex, toHex(cipher)},
-                                   {server::openPkcs1Base64, opensslBase64(cipher)},
-                                   {server::openKeyouHex, toHex(keyou)},
-                                   {server::openKeyouBase64, opensslBase64(keyou)}}) {
-    ASSERT_TRUE(opener(encKey(), text, &plain, &error)) << error;
-    EXPECT_EQ(plain, "hello");
-  }
-  EXPECT_FALSE(server::openPkcs1Hex(appKey(), toHex(cipher), &plain, &error)) << "2048-bit value, 1024-bit key";
-  EXPECT_FALSE(server::openPkcs1Hex(encKey(), "zz", &plain, &error));
-  // A timestamp with ':' before an RSA payload; without the encryption key it stays sealed.
-  server::OpenKeys keys{&appKey(), &encKey(), "", false};
-  server::Opened out;
-  const std::string type10 = opensslEnvelope(appKey(), kRc4Key, 512, "S2024-01-01 12:00:00:" + toHex(cipher));
-  ASSERT_TRUE(server::openOutput(10, type10, keys, &out, &error)) << error;
-  EXPECT_EQ(out.timestamp + "|" + out.content, "2024-01-01 12:00:00|hello");
-  keys.enc = nullptr;
-  EXPECT_TRUE(server::openOutput(10, type10, keys, &out, &error) && !out.contentOpened) << error;
-
-}
-
-// ---- the command line
-
-TEST(ServerCli, BadInputGivesOneLineAndNonZeroExit) {
-  const std::string good = opensslEnvelope(appKey(), kRc4Key, 512, "S1700000000:c359e5975c5a3f45");  // 48
-  const std::string app = dataPath("dispatch_app_key_1024.pem");
+// Without a timestamp: hex and base64 payloads split at the last ':', plain text at the first;
+// with the expected timestamp, right after it whatever the payload holds.
+TEST(ServerPayloads, SplitRule) {
   const struct {
-    const char* name;
-    std::vector<std::string> args;
-    int status;
-  } cases[] = {
-      {"garbage", {"--key", app, "hello world"}, 1},
-      {"type 48 opened as 47", {"--type", "47", "--key", app, good}, 1},
-      {"key file missing", {"--key", "/nonexistent.pem", good}, 2},
-      {"key file not PEM", {"--key", dataPath("SOURCES.md"), good}, 2},
-      {"unknown type", {"--type", "65", "--key", app, good}, 2},
-      {"no key", {good}, 2},
-      {"no encryption key for type 30", {"--type", "30", "--key", app, good}, 2},
-      {"no output", {"--key", app}, 2},
-      {"bad type", {"--type", "x1", good}, 2},
-      {"salt without password", {"--key", app, "--salt", "s", good}, 2},
-      {"wrong password", {"--type", "0", "--key", app, "--password", "c359e5975c5a3f4", good}, 3},
+    std::string content;
+    bool encoded;
+    std::string expected, fields;  // fields "" : rejected
+  } rows[] = {
+      {"S1700000000:pay:load", false, "", "S|1700000000|pay:load"},
+      {"S2024-01-01 12:00:00:0A1B", true, "", "S|2024-01-01 12:00:00|0A1B"},
+      {"S2024-01-01 12:00:00:pw:x", false, "", "S|2024-01-01 12|00:00:pw:x"},
+      {"S2024-01-01 12:00:00:pw:x", false, kTs, "S|2024-01-01 12:00:00|pw:x"},
+      {"S2024-01-01 12:00:00:pw:x", true, kTs, "S|2024-01-01 12:00:00|pw:x"},
+      {"S2024-01-01 12:00:01:pw", false, kTs, ""}, {"S2024-01-01 12:00:00", false, kTs, ""},
+      {"S123", false, "", ""}, {"X123:abc", true, "", ""}, {":123", true, "", ""}, {"", false, "", ""},
   };
-  for (const auto& c : cases) {
-    const CliRun run = runOpenCli(c.args);
-    EXPECT_EQ(run.status, c.status) << c.name << ": " << run.err;
-    EXPECT_EQ(run.err.rfind("tessel_open: ", 0), 0u) << c.name << ": " << run.err;
-    EXPECT_EQ(run.err.find('\n'), run.err.size() - 1) << c.name << ": not one line: " << run.err;
+  for (const auto& r : rows) {
+    server::Wrapped w;
+    std::string error;
+    const bool ok = server::splitWrapped(r.content, &w, &error, r.encoded, r.expected);
+    EXPECT_EQ(ok ? std::string(1, w.strength) + "|" + w.timestamp + "|" + w.payload : error,
+              r.fields.empty() ? "output rejected" : r.fields) << r.content;
+  }
+}
+
+// Length-prefixed pairs: "%02d" is two digits below 100 and three from 100 on.
+TEST(ServerPayloads, LengthPrefixedPairs) {
+  const struct {
+    std::string pair, fields;  // "" : rejected
+  } rows[] = {
+      {"041700041234", "1700|1234"}, {"0000", "|"}, {"02ab100" + std::string(100, 't'), "ab|" + std::string(100, 't')},
+      {"0417000510pw", ""}, {"041700021", ""}, {"0417000212345", ""}, {"x", ""},
+  };
+  for (const auto& r : rows) {
+    std::string ts, text, error;
+    const bool ok = server::parseLengthPrefixedPair(r.pair, &ts, &text, &error);
+    EXPECT_EQ(ok ? ts + "|" + text : error, r.fields.empty() ? "output rejected" : r.fields) << r.pair;
+  }
+}
+
+TEST(ServerPayloads, SaltedHashesKnownAnswers) {
+  // Values computed with Python's hashlib: md5(md5(p).hexdigest() + salt).hexdigest().
+  EXPECT_EQ(server::saltedHashValue("pw", "salt", 'S'), "c359e5975c5a3f45");
+  EXPECT_EQ(server::saltedHashValue("pw", "salt", 'F'), "38b311d8c359e5975c5a3f454d3f4294");
+  EXPECT_EQ(server::saltedHashValue("Passw0rd!", "::x::", 'F'), "f061fc492d56eb9b8e2dfe6bdd59f73c");
+  EXPECT_EQ(server::saltedHashValue("pw", "salt", 'X'), "");
+}
+
+// getNativeEncryptedPinCode's value: RC4 under SHA-1 of the challenge (up to its first zero).
+TEST(ServerCli, OpensEncryptedPinCodesAndReadsSecretsFromFiles) {
+  const std::string code = opensslBase64(opensslRc4(opensslSha1("chal"), bytesOf("1234")));
+  std::string pin, error;
+  ASSERT_TRUE(server::openEncryptedPinCode(std::string("chal\0junk", 9), code, &pin, &error)) << error;
+  EXPECT_EQ(pin, "1234");
+  const std::string pw = outputPath("pw.txt"), big = outputPath("big.txt");
+  std::ofstream(pw) << "1234\r\n";
+  std::ofstream(big) << std::string(4097, 'x');
+  const struct {
+    std::vector<std::string> args;
+    std::string input;
+    int status;
+    std::string out;
+  } rows[] = {
+      {{"--challenge", "chal", code}, "", 0, "content: 1234\n"},
+      {{"--challenge", "chal", "--password-file", pw, code}, "", 0, "content: 1234\npassword: match\n"},
+      {{"--challenge", "chal", "--password-file", "-", code}, "1234\n", 0, "content: 1234\npassword: match\n"},
+      {{"--challenge-file", pw, "--password", "1234", code}, "", 3, ""},  // challenge "1234"
+      {{"--challenge", "chal", "--password", "1235", code}, "", 3, ""},
+      {{"--challenge", "chal", "--password-file", "-", "-"}, code, 2, ""},
+      {{"--challenge", "chal", "--password-file", big, code}, "", 2, ""},
+      {{"--challenge", "chal", "--password-file", "/nonexistent", code}, "", 2, ""},
+      {{"--challenge", "chal", code + "x"}, "", 1, ""},
+      {{"--challenge", "chal", "-"}, std::string(65537, 'A') + "\n", 1, ""},
+  };
+  for (const auto& r : rows) {
+    const CliRun run = runOpenCli(r.args, r.input);
+    EXPECT_EQ(run.status, r.status) << r.args[2] << ": " << run.err;
+    EXPECT_EQ(run.out, r.out) << r.args[2];
   }
 }
 

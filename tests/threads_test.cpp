@@ -21,7 +21,7 @@
 #include <vector>
 
 #include "com_qn_tessel_plugin_QNKbdJniLib.h"
-#include "server/envelope.h"
+#include "server/password_check.h"
 #include "session/session.h"
 #include "common/egl_pbuffer.h"
 #include "support/openssl_oracle.h"

@@ -27,7 +27,8 @@ END = "<!-- perf-table:end -->"
 #   prefixes: every text of a hostile pattern, worst first), "added" (the peer is the same
 #   operation before a change: the difference in CPU time), "startup_added" (start-up in another
 #   build: peer names the default build's program, which ran the same benchmark; the difference
-#   in wall time).
+#   in wall time), "timing" (the opener's timing classes: per forged class the median difference
+#   to the valid class and its bootstrap 95% interval).
 ROWS = [
     ("RSA public op, 1024 bits", "crypto_bench", "BM_RsaPublic_Ours/1024", "BM_RsaPublic_OpenSsl/1024", "OpenSSL", "time", "≤ 1.1×"),
     ("RSA public op, 2048 bits", "crypto_bench", "BM_RsaPublic_Ours/2048", "BM_RsaPublic_OpenSsl/2048", "OpenSSL", "time", "≤ 1.1×"),
@@ -76,7 +77,36 @@ ROWS = [
     ("`getNativeContentLen`, session pinned", "session_bench", "BM_ContentLen/1", "BM_ContentLen/0", "raw pointer, as before pinning", "added", "≤ +50 ns"),
     ("One pin, shared (what a frame or surface call adds)", "session_bench", "BM_PinOnly/0", None, "", "alone", "≤ 1 µs per frame"),
     ("One pin, exclusive", "session_bench", "BM_PinOnly/1", None, "", "alone", ""),
+] + [
+    (f"C++ opener: forged type-48 envelope ({cls.replace('_', ' ')}), {bits}-bit key, 20,000 interleaved opens "
+     "per class: median difference to a valid one [95% CI]", "opener_timing_bench",
+     f"BM_OpenTiming/{bits}/iterations:1/repeats:1", cls, "", "timing", "CI ∋ 0, within ±50 ns")
+    for bits in (1024, 2048) for cls in ("bad_padding", "wrong_length_key", "wrong_16_byte_key")
 ]
+# The Java opener's timing lines (tools/server/java/bench/timing_bench.sh, same format as the C++
+# program's printout), read from java_opener_timing.txt: (what, bits, class, target).
+JAVA_TIMING_TARGET = "CI ∋ 0, within ±200 ns"
+TIMING_LINE = re.compile(r"^\s+(\w+)\s+median (\d+) ns, difference ([-+]?[\d.]+) ns, 95% CI \[([-+]?[\d.]+), ([-+]?[\d.]+)\]")
+HEADER_LINE = re.compile(r"^(\d+)-bit key, (\d+) opens per class: valid median (\d+) ns")
+
+
+def java_timing_rows(run_dir):
+    path = os.path.join(run_dir, "java_opener_timing.txt")
+    if not os.path.exists(path):
+        return []
+    rows, bits, opens, valid = [], None, None, None
+    for line in open(path):
+        h = HEADER_LINE.match(line)
+        if h:
+            bits, opens, valid = h.group(1), int(h.group(2)), float(h.group(3))
+            continue
+        m = TIMING_LINE.match(line)
+        if m and bits:
+            cls, diff, lo, hi = m.group(1), float(m.group(3)), float(m.group(4)), float(m.group(5))
+            rows.append(f"| Java opener: forged type-48 envelope ({cls.replace('_', ' ')}), {bits}-bit key, {opens:,} "
+                        f"interleaved opens per class: median difference to a valid one [95% CI] | {diff:+.0f} ns "
+                        f"[{lo:+.0f}, {hi:+.0f}] | valid {duration(valid)} | | {JAVA_TIMING_TARGET} |")
+    return rows
 
 UNIT_NS = {"ns": 1.0, "us": 1e3, "ms": 1e6, "s": 1e9}
 SPREAD = 0.05  # runs further apart than 5% of their median are shown as a range
@@ -168,6 +198,15 @@ def table(runs, meta):
                              f"{spread([wall(b) for b in peer], duration)} | {signed(added[0])} wall, "
                              f"{signed(added[1])} library CPU | {target} |")
             continue
+        if metric == "timing":
+            ours = runs.get((program, ours_name))
+            if ours:
+                used.add((program, ours_name))
+                c = ours[0]
+                lines.append(f"| {what} | {c[peer_name + '_diff_ns']:+.0f} ns "
+                             f"[{c[peer_name + '_ci_lo_ns']:+.0f}, {c[peer_name + '_ci_hi_ns']:+.0f}] | valid "
+                             f"{duration(c['valid_median_ns'])} | | {target} |")
+            continue
         if metric == "worst":
             row = worst_row(runs, what, program, ours_name, peer_name, peer_label, target, used)
             if row:
@@ -243,7 +282,7 @@ def main():
     run_dir, readme = sys.argv[1], sys.argv[2]
     meta = dict(line.rstrip("\n").split("=", 1) for line in open(os.path.join(run_dir, "meta.txt")) if "=" in line)
     runs = load(run_dir)
-    if not runs:
+    if not runs and not java_timing_rows(run_dir):
         sys.exit("perf_table: no benchmark results in " + run_dir)
     block = [
         BEGIN,
@@ -253,7 +292,7 @@ def main():
         f"ours and the peer in the same program; CPU time per operation, ratios per repetition; a range "
         f"(min–max) where the repetitions differ by more than {SPREAD:.0%}.",
         "",
-    ] + table(runs, meta) + [
+    ] + table(runs, meta) + java_timing_rows(run_dir) + [
         "",
         "Each program first prints Google Benchmark's \"Library was built as DEBUG\" warning: Debian's "
         "libbenchmark package is built without `NDEBUG`; the timed loop is inlined from its header into our "

@@ -50,5 +50,11 @@ for program in build-bench/bench/*_bench build-bench-compact/bench/render_bench;
              --benchmark_out_format=json >"$out/$name.txt" 2>&1
   echo "   $((SECONDS - start)) s, output in $out/$name.txt" >&2
 done
+# The Java opener's timing classes (same classes and statistics as opener_timing_bench), when
+# the JDK is there.
+if [ -f tools/server/java/bench/timing_bench.sh ] && command -v java >/dev/null; then
+  echo "== Java opener timing" >&2
+  bash tools/server/java/bench/timing_bench.sh >"$out/java_opener_timing.txt" 2>&1 || true
+fi
 echo "load_after=$(cut -d ' ' -f 1-3 /proc/loadavg)" >>"$out/meta.txt"
 python3 tools/perf_table.py "$out" README.md

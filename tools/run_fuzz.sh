@@ -9,7 +9,7 @@
 #                                                 a time at nice 19, growing a working corpus kept
 #                                                 outside the repository in build-fuzz/corpus-work/
 #
-# Targets default to all of der codec pattern dispatch session. The build directory is build-fuzz
+# Targets default to all of der codec pattern dispatch session opener. The build directory is build-fuzz
 # (TESSEL_FUZZ_BUILD overrides it). Per target: the full libFuzzer log in
 # build-fuzz/fuzz-logs/<mode>-<target>.log, crash inputs in build-fuzz/artifacts/<target>/; a
 # summary line per target (runs, exec/s, cov, ft, corpus) is printed at the end.
@@ -27,7 +27,7 @@ case "$mode" in
   *) sed -n '2,17p' "$0" >&2; exit 2 ;;
 esac
 targets=("$@")
-[[ ${#targets[@]} -eq 0 ]] && targets=(der codec pattern dispatch session)
+[[ ${#targets[@]} -eq 0 ]] && targets=(der codec pattern dispatch session opener)
 
 build="${TESSEL_FUZZ_BUILD:-build-fuzz}"
 jobs="${TESSEL_JOBS:-2}"

@@ -6,7 +6,7 @@
 #include <string>
 #include <vector>
 
-#include "server/envelope.h"
+#include "server/tessel_opener.h"
 #include "support/openssl_oracle.h"
 
 namespace tessel::test {

@@ -10,7 +10,6 @@
 // Usage: tessel_demo [--out DIR] [--no-shuffle]
 //        tessel_demo --window [--no-shuffle] [--exit-after-done] [--screenshot PATH]
 // Exits non-zero if any step fails or the backend's view disagrees with what was typed.
-#include <openssl/evp.h>
 
 #include <cstdio>
 #include <cstring>
@@ -25,7 +24,8 @@
 #include "pattern/strength.h"
 #include "render/surfaces.h"
 #include "road.h"
-#include "server/envelope.h"
+#include "server/bytes.h"
+#include "server/password_check.h"
 #include "session/output.h"
 #include "session/session.h"
 #include "typist.h"
@@ -43,18 +43,7 @@ namespace {
 const char kPassword[] = "Tessel#2026";
 const int kKeyboardWidth = 1080, kKeyboardHeight = 720, kPopHeight = 180;
 
-std::string md5Hex(const std::string& data) {
-  unsigned char digest[EVP_MAX_MD_SIZE];
-  unsigned int n = 0;
-  EVP_Digest(data.data(), data.size(), digest, &n, EVP_md5(), nullptr);
-  static const char digits[] = "0123456789abcdef";
-  std::string hex;
-  for (unsigned k = 0; k < n; ++k) {
-    hex += digits[digest[k] >> 4];
-    hex += digits[digest[k] & 15];
-  }
-  return hex;
-}
+std::string md5Hex(const std::string& data) { return server::toHex(server::digest("MD5", data), false); }
 
 // The three surfaces an app would host, and the frames they make.
 struct Screen {

@@ -7,7 +7,7 @@
 #include <string>
 
 #include "crypto/secure_buffer.h"
-#include "server/envelope.h"
+#include "server/tessel_opener.h"
 
 namespace demo {
 

@@ -23,8 +23,9 @@ public final class OpenerBench {
     int sink = 0;
     final long end = System.nanoTime() + nanos;
     while (System.nanoTime() < end) {
-      Opened o = opener.open(48, envelope);
-      sink += o.content().length();
+      try (Opened o = opener.open(48, envelope)) {
+        sink += o.contentOpened() ? 1 : 0;
+      }
       ++count;
     }
     if (sink == 0) throw new IllegalStateException("nothing opened");

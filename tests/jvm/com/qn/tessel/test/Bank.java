@@ -31,7 +31,7 @@ final class Bank {
   static String appKeyPem;
   static String encKeyPem;
 
-  record Result(int exit, Map<String, String> fields, String stderr) {
+  record Result(int exit, Map<String, String> fields, String stdout, String stderr) {
     String get(String field) {
       return fields.get(field);
     }
@@ -43,15 +43,19 @@ final class Bank {
       int colon = line.indexOf(": ");
       if (colon > 0) fields.put(line.substring(0, colon), line.substring(colon + 2));
     }
-    return new Result(exit, fields, new String(stderr, StandardCharsets.UTF_8).trim());
+    return new Result(exit, fields, new String(stdout, StandardCharsets.ISO_8859_1),
+        new String(stderr, StandardCharsets.UTF_8).trim());
   }
 
   static Result cpp(List<String> args, String output) throws Exception {
     List<String> cmd = new ArrayList<>(List.of(cppTool));
     cmd.addAll(args);
     Process p = new ProcessBuilder(cmd).start();
-    p.getOutputStream().write(output.getBytes(StandardCharsets.ISO_8859_1));
-    p.getOutputStream().close();
+    try (var stdin = p.getOutputStream()) {
+      stdin.write(output.getBytes(StandardCharsets.ISO_8859_1));
+    } catch (java.io.IOException e) {
+      // it stopped reading (an output over the cap): its answer is what counts
+    }
     byte[] stdout = p.getInputStream().readAllBytes();
     return parse(p.waitFor(), stdout, p.getErrorStream().readAllBytes());
   }
@@ -64,7 +68,7 @@ final class Bank {
     return parse(exit, out.toByteArray(), err.toByteArray());
   }
 
-  /** Both openers on the output of `type`; returns the C++ result once the two agree. */
+  /** Both openers on the output of `type`: exit codes and printed lines must agree; returns the C++ result. */
   static Result open(int type, String output, boolean withEncKey, String... options) throws Exception {
     List<String> args = new ArrayList<>(List.of("--type", Integer.toString(type), "--key", appKeyPem));
     if (withEncKey) args.addAll(List.of("--enc-key", encKeyPem));
@@ -73,11 +77,16 @@ final class Bank {
     Result c = cpp(args, output);
     Result j = java(args, output);
     Check.equal(c.exit(), j.exit(), "exit codes, type " + type + ": " + c.stderr() + " / " + j.stderr());
-    Check.equal(c.fields(), j.fields(), "fields, type " + type);
+    Check.equal(c.stdout(), j.stdout(), "printed lines, type " + type + " " + String.join(" ", options));
+    if (c.exit() == 3) Check.equal(c.stderr().replace("tessel_open", "tessel-server"), j.stderr(), "the one answer");
     return c;
   }
 
   // ---- oracles
+
+  static String latin1(byte[] b) {
+    return new String(b, StandardCharsets.ISO_8859_1);
+  }
 
   static byte[] ascii(String s) {
     return s.getBytes(StandardCharsets.ISO_8859_1);

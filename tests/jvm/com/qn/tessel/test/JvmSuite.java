@@ -10,6 +10,7 @@ import java.nio.file.Path;
 import java.security.KeyPair;
 import java.security.KeyPairGenerator;
 import java.security.PrivateKey;
+import java.security.interfaces.RSAPrivateCrtKey;
 import java.security.interfaces.RSAPrivateKey;
 import java.security.interfaces.RSAPublicKey;
 import java.util.Locale;
@@ -28,10 +29,16 @@ public final class JvmSuite {
   static final String TIMESTAMP = "20260101120000";
 
   static String appModulusHex;
+  static RSAPrivateCrtKey appKey;
+  static int encKeyBytes = 128;
   static String encModulusHex;
   static TesselOpener opener;
 
   private JvmSuite() {}
+
+  static int appKeyBytes() {
+    return (appKey.getModulus().bitLength() + 7) / 8;
+  }
 
   static String property(String name) {
     String v = System.getProperty(name);
@@ -79,6 +86,7 @@ public final class JvmSuite {
     Bank.cppTool = property("tessel.server");
     Bank.appKeyPem = property("tessel.appKey");
     PrivateKey app = PemKeys.read(Path.of(Bank.appKeyPem));
+    appKey = (RSAPrivateCrtKey) app;
     appModulusHex = ((RSAPrivateKey) app).getModulus().toString(16).toUpperCase(Locale.ROOT);
     KeyPairGenerator generator = KeyPairGenerator.getInstance("RSA");
     generator.initialize(1024);
@@ -97,6 +105,7 @@ public final class JvmSuite {
     });
     EntryPointTests.run();
     OutputTests.run();
+    ForgeryTests.run();
     RenderTests.run();
     destroyAll();
     System.out.printf("%d checks failed%n", Check.failures);

@@ -15,21 +15,22 @@ public final class EncryptedPinCode {
    * @param challenge the challenge code the app passed to setNativeChallengeCode (the device
    *     reads it up to its first zero byte, and so does this method)
    * @param code the base64 text the device returned
-   * @return the typed text
-   * @throws OpenException.BadEncoding when the code is not base64
+   * @return the typed text; wipe it
+   * @throws OpenException.TooLong when the code is longer than {@value TesselOpener#MAX_OUTPUT} bytes
+   * @throws OpenException.BadEncoding when the code is not canonical base64
    */
-  public static String open(byte[] challenge, String code) throws OpenException.BadEncoding {
+  public static byte[] open(byte[] challenge, String code) throws OpenException {
     int end = 0;
     while (end < challenge.length && challenge[end] != 0) ++end;
     if (end == 0) throw new IllegalArgumentException("the challenge code is empty");
-    byte[] sealed = Bytes.fromBase64(code, "encrypted PIN code");
+    if (code.length() > TesselOpener.MAX_OUTPUT) throw new OpenException.TooLong();
+    byte[] sealed = Bytes.fromBase64(Bytes.latin1(code), "encrypted PIN code");
     byte[] used = Arrays.copyOf(challenge, end);
     byte[] key = Bytes.digest("SHA-1", used);
-    byte[] plain = Bytes.rc4(key, 0, sealed);
     try {
-      return Bytes.text(plain, 0, plain.length);
+      return Bytes.rc4(key, 0, sealed);
     } finally {
-      Bytes.wipe(sealed, used, key, plain);
+      Bytes.wipe(sealed, used, key);
     }
   }
 }

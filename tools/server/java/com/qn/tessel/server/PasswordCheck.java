@@ -1,7 +1,9 @@
 package com.qn.tessel.server;
 
+import java.nio.ByteBuffer;
+import java.nio.CharBuffer;
 import java.nio.charset.StandardCharsets;
-import java.security.MessageDigest;
+import java.util.Arrays;
 
 /**
  * Checks an opened output against the password the bank has on file.
@@ -10,10 +12,22 @@ import java.security.MessageDigest;
  * {@code ("2:" + salt)}, the hashed types (47, 48, 55, 59) carry the salted value
  * {@code MD5hex(MD5hex(password) + salt)}: its characters 8..23 for "1:" (mode S), all 32 for
  * "2:" (mode F). Without a hash random they carry the password itself. Type 5 carries the
- * upper-case SHA-1 hex of the password; every other type the text.
+ * upper-case SHA-1 hex of the password; every other type the text. Passwords are taken as
+ * {@code char[]} (encoded as UTF-8) so the caller can wipe them; every copy made here is wiped.
+ *
+ * <p>A mismatch must get the same answer as a rejected output ({@link OpenException.Rejected}):
+ * a forged envelope must look exactly like a wrong password.
  */
 public final class PasswordCheck {
   private PasswordCheck() {}
+
+  static byte[] utf8(char[] password) {
+    ByteBuffer b = StandardCharsets.UTF_8.encode(CharBuffer.wrap(password));
+    byte[] out = new byte[b.remaining()];
+    b.get(out);
+    if (b.hasArray()) Bytes.wipe(b.array());
+    return out;
+  }
 
   /**
    * The salted value the hashed types carry.
@@ -21,17 +35,32 @@ public final class PasswordCheck {
    * @param password the password
    * @param salt the salt (the hash random after its two-character prefix)
    * @param mode 'S' or 'F'
-   * @return 16 (S) or 32 (F) lower-case hex digits
+   * @return 16 (S) or 32 (F) lower-case hex digits; wipe them
    */
-  public static String saltedValue(String password, String salt, char mode) {
+  public static char[] saltedValue(char[] password, String salt, char mode) {
+    byte[] pw = utf8(password);
+    byte[] value = saltedValue(pw, salt, mode);
+    try {
+      return Bytes.chars(value);
+    } finally {
+      Bytes.wipe(pw, value);
+    }
+  }
+
+  private static byte[] saltedValue(byte[] password, String salt, char mode) {
     if (mode != 'S' && mode != 'F') throw new IllegalArgumentException("mode is S or F");
-    byte[] pw = password.getBytes(StandardCharsets.UTF_8);
-    byte[] d1 = Bytes.digest("MD5", pw);
-    byte[] h1 = (Bytes.toHex(d1, false) + salt).getBytes(StandardCharsets.UTF_8);
-    byte[] d2 = Bytes.digest("MD5", h1);
-    String h2 = Bytes.toHex(d2, false);
-    Bytes.wipe(pw, d1, h1, d2);
-    return mode == 'S' ? h2.substring(8, 24) : h2;
+    byte[] d1 = Bytes.digest("MD5", password);
+    char[] h1 = Bytes.toHex(d1, false);
+    byte[] h1Bytes = Bytes.latin1(h1);
+    byte[] d2 = Bytes.digest("MD5", h1Bytes, salt.getBytes(StandardCharsets.UTF_8));
+    char[] h2 = Bytes.toHex(d2, false);
+    try {
+      return Bytes.latin1(mode == 'S' ? Arrays.copyOfRange(h2, 8, 24) : h2);
+    } finally {
+      Bytes.wipe(d1, h1Bytes, d2);
+      Bytes.wipe(h1);
+      Bytes.wipe(h2);
+    }
   }
 
   /**
@@ -43,7 +72,7 @@ public final class PasswordCheck {
    *     when it set none
    * @return true on a match; false when the content stayed sealed
    */
-  public static boolean matches(Opened opened, String password, String hashRandom) {
+  public static boolean matches(Opened opened, char[] password, String hashRandom) {
     if (hashRandom == null || hashRandom.isEmpty()) return matches(opened, password, "", 'S');
     if (hashRandom.length() < 2 || hashRandom.charAt(1) != ':' || "12".indexOf(hashRandom.charAt(0)) < 0) {
       throw new IllegalArgumentException("a hash random starts with \"1:\" or \"2:\"");
@@ -60,26 +89,35 @@ public final class PasswordCheck {
    * @param mode 'S' or 'F' (ignored without a salt)
    * @return true on a match; false when the content stayed sealed
    */
-  public static boolean matches(Opened opened, String password, String salt, char mode) {
+  public static boolean matches(Opened opened, char[] password, String salt, char mode) {
+    byte[] pw = utf8(password);
+    try {
+      return matches(opened, pw, salt, mode);
+    } finally {
+      Bytes.wipe(pw);
+    }
+  }
+
+  /** The check on the password's bytes (the command line reads them from a file as they are). */
+  static boolean matches(Opened opened, byte[] password, String salt, char mode) {
     if (!opened.contentOpened()) return false;
-    final Types.Inner inner = Types.of(opened.type()).inner;
-    final String expected;
+    final Types.Inner inner = Types.of(opened.type()).inner();
+    byte[] expected;
     if ((inner == Types.Inner.HASHED || inner == Types.Inner.HASHED_RSA) && !salt.isEmpty()) {
       expected = saltedValue(password, salt, mode);
     } else if (inner == Types.Inner.TYPE5) {
-      byte[] pw = password.getBytes(StandardCharsets.UTF_8);
-      byte[] d = Bytes.digest("SHA-1", pw);
-      expected = Bytes.toHex(d, true);
-      Bytes.wipe(pw, d);
+      byte[] d = Bytes.digest("SHA-1", password);
+      char[] hex = Bytes.toHex(d, true);
+      expected = Bytes.latin1(hex);
+      Bytes.wipe(d);
+      Bytes.wipe(hex);
     } else {
-      expected = new String(password.getBytes(StandardCharsets.UTF_8), StandardCharsets.ISO_8859_1);
+      expected = password.clone();
     }
-    byte[] a = Bytes.latin1(expected);
-    byte[] b = Bytes.latin1(opened.content());
     try {
-      return MessageDigest.isEqual(a, b);  // time independent of where they differ
+      return opened.contentEquals(expected);
     } finally {
-      Bytes.wipe(a, b);
+      Bytes.wipe(expected);
     }
   }
 }
