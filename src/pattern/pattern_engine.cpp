@@ -11,15 +11,11 @@
 // Matching state is (pc, position, s): s counts the enclosing loops, outermost first, whose
 // current iteration has consumed something (those that have not always form the innermost
 // part of the nesting, so a count is enough). Without back-references nothing else decides
-// how the rest of the pattern can go, so a state that failed once fails again: kAlt and
-// kStar remember failed states (per position, s) and a kStar remembers which of its end
-// positions failed as one interval. The no-progress rule of the driver depends on the ways
-// seen so far, but only through a three-valued tracker (no way yet; last way moved; last way
-// ended at the start), and only ways that end at the start position change it in a way that
-// depends on the past: a state away from the start only emits ways that moved, so its
-// remembered failure keeps one bit (did it emit a way), and a state at the start keeps its
-// outcome per tracker value. With back-references the captures are part of the state, so
-// nothing is remembered and the step limit applies.
+// how the rest of the pattern can go (the driver keeps no history of the ways it saw), so a
+// state that failed once fails again: kAlt and kStar remember failed states (per position, s)
+// and a kStar remembers which of its end positions failed as one interval. With
+// back-references the captures are part of the state, so nothing is remembered and the step
+// limit applies.
 #include "pattern/pattern_engine.h"
 
 #include <algorithm>
@@ -58,23 +54,17 @@ enum class FrameKind : std::uint8_t { kAlt, kStar, kUndo, kFailMark, kAtomic };
 
 struct PatternFrame {
   FrameKind kind;
-  std::uint8_t tracker;  // kFailMark: tracker when the state was entered
   std::int32_t pc;       // kFailMark: memo point
   std::int32_t pos;
   std::int32_t s;
   std::int32_t x;        // kAlt: next alternative; kStar: next end; kUndo: slot
   std::int32_t y;        // kStar: end being tried; kUndo: old value
   std::int32_t z;        // kStar: last end
-  std::uint64_t ways;    // ways emitted when the state (or the kStar end) was entered
 };
 
 namespace {
 
 const std::uint8_t kNoText[1] = {0};
-
-// Tracker of the no-progress rule: no way yet; the last way moved (or was the first);
-// the last way (second or later) ended at the start; stop.
-constexpr std::uint8_t kTrackNone = 0, kTrackMoved = 1, kTrackAtStart = 2, kTrackStop = 3;
 
 struct CompileError {
   PatternEngine::Status status;
@@ -548,14 +538,15 @@ class Matcher {
   Matcher(MatchContext& c, std::vector<PatternFrame>& stack, std::vector<std::int32_t>& slots,
           std::vector<std::uint8_t*>& rows, std::vector<std::int32_t>& stars, std::size_t& memoBytes,
           const PatternInst* code, const ByteSet* sets, const std::uint8_t* text, std::int32_t n,
-          bool rtl, bool backrefs, bool spans, int groups)
+          bool rtl, bool backrefs, bool spans, int groups, MatchContext::Memo memo)
       : c_(c), stack_(stack), slots_(slots), rows_(rows), stars_(stars), memoBytes_(memoBytes),
         code_(code), sets_(sets), text_(text), n_(n), dir_(rtl ? -1 : 1), start_(rtl ? n : 0),
         end_(rtl ? 0 : n), backrefs_(backrefs), spans_(spans || backrefs),
-        openBase_(2 * (groups + 1)) {}
+        openBase_(2 * (groups + 1)), remember_(!backrefs && memo != MatchContext::Memo::kNever),
+        memoFromStart_(memo == MatchContext::Memo::kAlways) {}
 
   // True on a whole match; throws std::bad_alloc when memory runs out.
-  bool run(bool& gaveUp, bool& stopped);
+  bool run(bool& gaveUp);
 
  private:
   std::int32_t avail(std::int32_t pos) const noexcept { return dir_ > 0 ? n_ - pos : pos; }
@@ -567,17 +558,18 @@ class Matcher {
       stack_.reserve(std::max<std::size_t>(64, stack_.capacity() * 2));
       c_.noteBytes();
     }
-    stack_.push_back(PatternFrame{k, tracker_, pc, pos, s, x, y, z, ways_});
+    stack_.push_back(PatternFrame{k, pc, pos, s, x, y, z});
   }
   void setSlot(std::int32_t slot, std::int32_t value) {
     push(FrameKind::kUndo, 0, 0, 0, slot, slots_[static_cast<std::size_t>(slot)]);
     slots_[static_cast<std::size_t>(slot)] = value;
   }
 
+  // One bit per (position, loop progress) of a memo point, allocated on its first failure.
   std::uint8_t* row(std::int32_t memo, std::int32_t depth, bool create) {
     std::uint8_t*& r = rows_[static_cast<std::size_t>(memo)];
     if (r == nullptr && create) {
-      const std::size_t bytes = static_cast<std::size_t>(depth + 1) * static_cast<std::size_t>(n_ + 4);
+      const std::size_t bytes = (static_cast<std::size_t>(depth + 1) * static_cast<std::size_t>(n_ + 1) + 7) / 8;
       r = static_cast<std::uint8_t*>(std::calloc(bytes, 1));
       if (r == nullptr) throw std::bad_alloc();
       memoBytes_ += bytes;
@@ -586,31 +578,21 @@ class Matcher {
     return r;
   }
   std::size_t cell(std::int32_t pos, std::int32_t s) const noexcept {
-    const std::size_t base = static_cast<std::size_t>(s) * static_cast<std::size_t>(n_ + 4);
-    return pos == start_ ? base + static_cast<std::size_t>(n_) + 1 + tracker_ : base + static_cast<std::size_t>(pos);
+    return static_cast<std::size_t>(s) * static_cast<std::size_t>(n_ + 1) + static_cast<std::size_t>(pos);
   }
-  // True when (memo, pos, s) is known to fail; applies its effect on the tracker.
-  bool knownFailure(const PatternInst& in, std::int32_t pos, std::int32_t s) {
+  // True when (memo point, pos, s) is known to fail.
+  bool knownFailure(const PatternInst& in, std::int32_t pos, std::int32_t s) const noexcept {
     if (!memoOn_ || in.memo < 0) return false;
-    const std::uint8_t* r = row(in.memo, in.depth, false);
+    const std::uint8_t* r = rows_[static_cast<std::size_t>(in.memo)];
     if (r == nullptr) return false;
-    const std::uint8_t v = r[cell(pos, s)];
-    if (v == 0) return false;
-    if (pos == start_) {
-      tracker_ = static_cast<std::uint8_t>(v - 1);
-    } else if (v == 2) {
-      tracker_ = kTrackMoved;
-    }
-    return true;
+    const std::size_t k = cell(pos, s);
+    return (r[k / 8] >> (k % 8) & 1) != 0;
   }
   void recordFailure(const PatternFrame& f) {
     const PatternInst& in = code_[f.pc];
     std::uint8_t* r = row(in.memo, in.depth, true);
-    const std::uint8_t saved = tracker_;
-    tracker_ = f.tracker;  // the cell of a start state is keyed by the entry tracker
     const std::size_t k = cell(f.pos, f.s);
-    tracker_ = saved;
-    r[k] = f.pos == start_ ? static_cast<std::uint8_t>(tracker_ + 1) : (ways_ != f.ways ? 2 : 1);
+    r[k / 8] = static_cast<std::uint8_t>(r[k / 8] | 1u << (k % 8));
   }
 
   // kStar bookkeeping, 6 ints per memo point: run start and end, failed ends lo..hi, emitted,
@@ -654,23 +636,20 @@ class Matcher {
     d[5] = k < limit ? 1 : 0;
     return k;
   }
-  void starEndFailed(const PatternInst& in, std::int32_t end, bool emitted) {
+  void starEndFailed(const PatternInst& in, std::int32_t end) {
     std::int32_t* d = star(in);
     if (d[2] <= d[3] && end >= d[2] - 1 && end <= d[3] + 1) {
       d[2] = std::min(d[2], end);
       d[3] = std::max(d[3], end);
-      d[4] |= emitted ? 1 : 0;
     } else {
       d[2] = d[3] = end;
-      d[4] = emitted ? 1 : 0;
     }
   }
   // Next end to try from `q`, stepping by `step`, jumping over ends known to fail.
   std::int32_t skipFailedEnds(const PatternInst& in, std::int32_t p, std::int32_t q, std::int32_t step) {
-    if (backrefs_ || q == p) return q;
+    if (!remember_ || q == p) return q;
     const std::int32_t* d = star(in);
     if (d[2] > d[3] || q < d[2] || q > d[3]) return q;
-    if (d[4] != 0 && tracker_ != kTrackMoved) return q;
     std::int32_t next = step < 0 ? d[2] - 1 : d[3] + 1;
     if ((q > p && next < p) || (q < p && next > p)) next = p;
     return next;
@@ -692,19 +671,20 @@ class Matcher {
   bool backrefs_;
   bool spans_;
   std::int32_t openBase_;
+  bool remember_;  // failed states may be remembered: no back-references, not plain mode
+  bool memoFromStart_;
   bool memoOn_ = false;
-  std::uint8_t tracker_ = kTrackNone;
-  std::uint64_t ways_ = 0;
 };
 
-bool Matcher::run(bool& gaveUp, bool& stopped) {
+bool Matcher::run(bool& gaveUp) {
   std::int32_t pc = 0, pos = start_, s = 0;
   std::int64_t steps = 0;
   // Remembering failures costs a little per branch; a match that backtracks less than about
   // twice the text length never needs it.
-  std::int64_t resumesBeforeMemo = backrefs_ ? -1 : 2 * static_cast<std::int64_t>(n_) + 32;
+  std::int64_t resumesBeforeMemo = !remember_ ? -1 : memoFromStart_ ? 1 : 2 * static_cast<std::int64_t>(n_) + 32;
+  memoOn_ = remember_ && memoFromStart_;
   for (;;) {
-    if (backrefs_ && ++steps > kBackrefStepLimit) {
+    if (!remember_ && ++steps > kBackrefStepLimit) {
       gaveUp = true;
       return false;
     }
@@ -846,17 +826,6 @@ bool Matcher::run(bool& gaveUp, bool& stopped) {
           slots_[1] = pos;
           return true;
         }
-        ++ways_;
-        if (tracker_ == kTrackNone) {
-          tracker_ = kTrackMoved;
-        } else if (pos != start_) {
-          tracker_ = kTrackMoved;
-        } else if (tracker_ == kTrackMoved) {
-          tracker_ = kTrackAtStart;
-        } else {
-          stopped = true;  // two ways in a row ended where matching began
-          return false;
-        }
         ok = false;
         break;
     }
@@ -880,7 +849,7 @@ bool Matcher::run(bool& gaveUp, bool& stopped) {
         stack_.pop_back();
         continue;
       }
-      if (backrefs_ && ++steps > kBackrefStepLimit) {
+      if (!remember_ && ++steps > kBackrefStepLimit) {
         gaveUp = true;
         return false;
       }
@@ -900,7 +869,7 @@ bool Matcher::run(bool& gaveUp, bool& stopped) {
       }
       // kStar: the end f.y failed; try the next one.
       const PatternInst& st = code_[f.pc];
-      if (f.y != f.pos && !backrefs_) starEndFailed(st, f.y, ways_ != f.ways);
+      if (f.y != f.pos && remember_) starEndFailed(st, f.y);
       const std::int32_t step = (st.mode == kGreedy) == (dir_ > 0) ? -1 : 1;
       const std::int32_t q = skipFailedEnds(st, f.pos, f.x, step);
       if ((q - f.z) * step > 0) {
@@ -909,7 +878,6 @@ bool Matcher::run(bool& gaveUp, bool& stopped) {
       }
       f.y = q;
       f.x = q + step;
-      f.ways = ways_;
       pos = q;
       s = q != f.pos ? st.depth : f.s;
       pc = f.pc + 1;
@@ -923,7 +891,6 @@ bool Matcher::run(bool& gaveUp, bool& stopped) {
 bool PatternEngine::run(MatchContext& c, const std::uint8_t* text, std::size_t length,
                         bool spans) const noexcept {
   c.gaveUp_ = false;
-  c.stopped_ = false;
   if (!compiled_ || length > static_cast<std::size_t>(kUnbounded) / 2) return false;
   const auto n = static_cast<std::int32_t>(length);
   if (text == nullptr) text = kNoText;
@@ -942,8 +909,8 @@ bool PatternEngine::run(MatchContext& c, const std::uint8_t* text, std::size_t l
     c.memoBytes_ = 0;
     c.noteBytes();
     Matcher m(c, c.stack_, c.slots_, c.memoRows_, c.starData_, c.memoBytes_, code_.data(),
-              sets_.data(), text, n, rightToLeft_, backrefs_, spans, groups_);
-    matched = m.run(c.gaveUp_, c.stopped_);
+              sets_.data(), text, n, rightToLeft_, backrefs_, spans, groups_, c.memo_);
+    matched = m.run(c.gaveUp_);
   } catch (...) {
     matched = false;
   }

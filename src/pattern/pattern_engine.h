@@ -29,9 +29,8 @@
 //   A pattern whose program would pass kMaxProgram instructions (counted repetitions are
 //   expanded) is refused as kTooLarge.
 // - Whole-text driver: the ways of matching are tried in order until one ends at the end of
-//   the text; the search also ends, without a match, when the second or a later way and the
-//   way right after it both end where matching began (the no-progress rule). That only
-//   matters for patterns with several empty ways, such as "(||)b*|a" against "a".
+//   the text. It keeps no rule over the ways it has seen: empty iterations end their loop
+//   (below), so the search always ends, and no alternative is made unreachable.
 // - Repetitions: mandatory iterations are all run, even when they consume nothing; an
 //   optional iteration that consumes nothing is kept but ends the loop (greedy, reluctant
 //   and possessive alike).
@@ -81,10 +80,15 @@ class MatchContext {
   MatchContext(const MatchContext&) = delete;
   MatchContext& operator=(const MatchContext&) = delete;
 
+  // When failed states are remembered: kAuto once the search has backtracked about twice the
+  // text length; kAlways from the first step; kNever (plain backtracking). Outcome and spans are
+  // the same in every mode (kNever has the step limit of back-references); the last two let
+  // tests compare the memo with plain backtracking.
+  enum class Memo : std::uint8_t { kAuto, kAlways, kNever };
+  void setMemo(Memo memo) noexcept { memo_ = memo; }
+
   // The last match stopped on kBackrefStepLimit (reported as no match).
   bool gaveUp() const noexcept { return gaveUp_; }
-  // The last match ended on the no-progress rule of the whole-text driver.
-  bool stoppedWithoutProgress() const noexcept { return stopped_; }
   // Heap bytes the working state held at its largest, over this context's life.
   std::size_t peakBytes() const noexcept { return peakBytes_; }
   // Updates peakBytes() after the matcher grew a buffer.
@@ -99,8 +103,8 @@ class MatchContext {
   std::vector<std::int32_t> starData_;     // per single-byte repetition: run and failed targets
   std::size_t memoBytes_ = 0;
   std::size_t peakBytes_ = 0;
+  Memo memo_ = Memo::kAuto;
   bool gaveUp_ = false;
-  bool stopped_ = false;
 };
 
 class PatternEngine {
