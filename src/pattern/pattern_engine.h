@@ -34,7 +34,8 @@
 // - Repetitions: mandatory iterations are all run, even when they consume nothing; an
 //   optional iteration that consumes nothing is kept but ends the loop (greedy, reluctant
 //   and possessive alike).
-// - Inside a set a backslash still escapes ("[\]\-]"), and \b there is backspace.
+// - Inside a set a backslash is a plain byte: "[a-z\]" is a to z and the backslash, "[\d]" the
+//   backslash and 'd'.
 // - '^' and \A match at offset 0; '$' and \Z at the end or before a final '\n'; \z at the
 //   end; \G at the position the match started from; \b and \B use \w (alnum and '_').
 // - A back-reference sees the group's last completed capture of the current way: inside its

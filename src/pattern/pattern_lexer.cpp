@@ -110,8 +110,7 @@ class Lexer {
     const bool atStart = setStart_;
     setStart_ = false;
     if (c == '[' && i_ + 1 < n_ && p_[i_ + 1] == ':') return namedClass();
-    if (c == '\\') return escape();
-    ++i_;
+    ++i_;  // a backslash is a plain byte here
     if (c == ']') {
       depth_ = 0;
       return special(']');
@@ -143,7 +142,6 @@ class Lexer {
     if (i_ + 1 >= n_) return false;
     const char e = p_[i_ + 1];
     i_ += 2;
-    const bool inSet = depth_ != 0;
     switch (e) {
       case 'd': return classToken(NamedClass::kDigit, false);
       case 'D': return classToken(NamedClass::kDigit, true);
@@ -151,13 +149,9 @@ class Lexer {
       case 'S': return classToken(NamedClass::kSpace, true);
       case 'w': return classToken(NamedClass::kWord, false);
       case 'W': return classToken(NamedClass::kWord, true);
-      case 'b':
-        if (inSet) return rawByte(0x08);  // backspace inside a set, as usual
-        return assertion('b');
-      case 'A': case 'Z': case 'z': case 'B': case 'G':
-        if (inSet) return false;
+      case 'A': case 'Z': case 'z': case 'b': case 'B': case 'G':
         return assertion(static_cast<std::uint8_t>(e));
-      case 'g': case 'k': return backrefSyntax(inSet);
+      case 'g': case 'k': return backrefSyntax();
       case 'Q': quoting_ = true; return true;
       case 'E': caseMode_ = CaseMode::kNone; return true;
       case 'L': caseMode_ = CaseMode::kLower; return true;
@@ -179,8 +173,8 @@ class Lexer {
 
   // \gN \g{N} \g{-N} \kN \k{N} \k<N>: absolute group numbers, or relative to the groups
   // opened so far (every '(' opens a capturing group in this syntax).
-  bool backrefSyntax(bool inSet) noexcept {
-    if (inSet || i_ >= n_) return false;
+  bool backrefSyntax() noexcept {
+    if (i_ >= n_) return false;
     char close = 0;
     if (p_[i_] == '{') close = '}';
     if (p_[i_] == '<') close = '>';
