@@ -25,7 +25,6 @@
 #include <string>
 #include <vector>
 
-#include "pattern/match.h"
 #include "pattern/pattern_engine.h"
 #include "pattern/strength.h"
 
@@ -64,7 +63,9 @@ void BM_Ours(benchmark::State& state, const AcceptsCase* c, int length) {
   const auto* bytes = reinterpret_cast<const std::uint8_t*>(text.data());
   bool matched = false;
   for (auto _ : state) {
-    matched = tessel::wholeMatch(c->ours, bytes, text.size());
+    const tessel::PatternEngine engine(c->ours);
+    tessel::MatchContext context;
+    matched = engine.matches(bytes, text.size(), &context);
     benchmark::DoNotOptimize(matched);
   }
   state.counters["matched"] = matched;

@@ -12,7 +12,7 @@
 #include "crypto/bignum.h"
 #include "crypto/codec.h"
 #include "crypto/der.h"
-#include "pattern/match.h"
+#include "pattern/pattern_engine.h"
 #include "pattern/strength.h"
 
 using namespace tessel;
@@ -24,7 +24,7 @@ std::string sameAs(const SecureBuffer& b) {
 }
 
 bool matches(const std::string& pattern, const std::string& text) {
-  return wholeMatch(pattern.c_str(), reinterpret_cast<const std::uint8_t*>(text.data()), text.size());
+  return PatternEngine(pattern.c_str()).matches(reinterpret_cast<const std::uint8_t*>(text.data()), text.size());
 }
 
 // Each reader, run on text built around one byte `c`; a high byte must give what `reference`

@@ -5,7 +5,6 @@
 #include <cstring>
 
 #include "pattern/char_class.h"
-#include "pattern/pattern_engine.h"
 
 namespace tessel {
 
@@ -44,8 +43,8 @@ enum class CaseMode { kNone, kLower, kUpper };
 
 class Lexer {
  public:
-  Lexer(const char* p, std::size_t n, std::uint32_t flags, TokenList& out) noexcept
-      : p_(p), n_(n), extended_((flags & PatternEngine::kExtended) != 0), out_(out) {}
+  Lexer(const char* p, std::size_t n, bool extended, TokenList& out) noexcept
+      : p_(p), n_(n), extended_(extended), out_(out) {}
 
   bool run() noexcept {
     while (i_ < n_) {
@@ -188,7 +187,7 @@ class Lexer {
     std::size_t digits = 0;
     while (i_ < n_ && p_[i_] >= '0' && p_[i_] <= '9') {
       value = value * 10 + (p_[i_] - '0');
-      if (value > PatternEngine::kUnbounded) return false;
+      if (value > INT32_MAX) return false;
       ++i_;
       ++digits;
     }
@@ -259,9 +258,8 @@ class Lexer {
 
 }  // namespace
 
-bool lexPattern(const char* pattern, std::size_t length, std::uint32_t flags,
-                TokenList& out) noexcept {
-  Lexer lexer(pattern, length, flags, out);
+bool lexPattern(const char* pattern, std::size_t length, bool extended, TokenList& out) noexcept {
+  Lexer lexer(pattern, length, extended, out);
   return lexer.run();
 }
 

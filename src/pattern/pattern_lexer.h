@@ -52,8 +52,8 @@ class TokenList {
   std::size_t capacity_ = kInlineTokens;
 };
 
-// Tokenizes pattern[0, length). False when the pattern cannot be read or memory runs out.
-bool lexPattern(const char* pattern, std::size_t length, std::uint32_t flags,
-                TokenList& out) noexcept;
+// Tokenizes pattern[0, length), `extended` skipping white space and '#' comments outside sets.
+// False when the pattern cannot be read or memory runs out.
+bool lexPattern(const char* pattern, std::size_t length, bool extended, TokenList& out) noexcept;
 
 }  // namespace tessel
