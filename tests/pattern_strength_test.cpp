@@ -115,7 +115,8 @@ TEST(Verify, ReasonCodesInOrder) {
   for (const Case& c : cases) {
     PasswordRule rule;
     rule.minLength = c.minLength;
-    rule.acceptsPattern = c.accepts;
+    const PatternEngine accepts(c.accepts);
+    rule.accepts = c.accepts != nullptr ? &accepts : nullptr;
     rule.requiredClasses = c.classes;
     ASSERT_TRUE(parseDictionary(c.dictionary, &rule.dictionary));
     EXPECT_EQ(verifyPassword(c.ruleSet, c.text, c.full, rule), c.expected) << c.ruleSet << " " << c.text;
