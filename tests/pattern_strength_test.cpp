@@ -8,8 +8,10 @@
 #include <thread>
 #include <vector>
 
+#include "pattern/pattern_engine.h"
 #include "pattern/strength.h"
 #include "session/session.h"
+#include "session/settings.h"
 #include "support/keyboard_typist.h"
 
 using namespace tessel;
@@ -173,7 +175,7 @@ TEST(StrengthSession, DegreeAndVerifyFromTheSettingsReseal) {
   EXPECT_EQ(kb.restingBuffer(), sealed) << "content must be sealed again, unchanged";
   type("abcdef");
   EXPECT_EQ(sessionVerify(s), -3) << "no accepts pattern set";
-  ASSERT_TRUE(replaceOwnedText(s.accepts, "[:alnum:]+"));
+  setAccepts(s, "[:alnum:]+");
   s.minLength = 6;
   s.content->contentType = 3;
   const std::string sealedAgain = kb.restingBuffer();
