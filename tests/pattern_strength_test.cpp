@@ -117,8 +117,8 @@ TEST(Verify, ReasonCodesInOrder) {
   for (const Case& c : cases) {
     PasswordRule rule;
     rule.minLength = c.minLength;
-    const PatternEngine accepts(c.accepts);
-    rule.accepts = c.accepts != nullptr ? &accepts : nullptr;
+    const PatternEngine accepts(c.accepts);  // a null pattern never matches, like no pattern
+    rule.accepts = &accepts;
     rule.requiredClasses = c.classes;
     ASSERT_TRUE(parseDictionary(c.dictionary, &rule.dictionary));
     EXPECT_EQ(verifyPassword(c.ruleSet, c.text, c.full, rule), c.expected) << c.ruleSet << " " << c.text;

@@ -92,8 +92,8 @@ class MatchContext {
 
   // When failed states are remembered: kAuto once the search has backtracked about twice the
   // text length; kAlways from the first step; kNever (plain backtracking). Outcome and spans are
-  // the same in every mode (kNever has the step limit of back-references); the last two let
-  // tests compare the memo with plain backtracking.
+  // the same in every mode, except that kNever gives up after kBackrefStepLimit / 10 steps
+  // (without back-references); the last two let tests compare the memo with plain backtracking.
   enum class Memo : std::uint8_t { kAuto, kAlways, kNever };
   void setMemo(Memo memo) noexcept { memo_ = memo; }
 

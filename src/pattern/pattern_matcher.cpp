@@ -51,7 +51,8 @@ class Matcher {
       : c_(c), stack_(c.stack_), slots_(c.slots_), code_(code), sets_(sets), text_(text), n_(n),
         dir_(rtl ? -1 : 1), start_(rtl ? n : 0), end_(rtl ? 0 : n), spans_(spans || backrefs),
         openBase_(2 * (groups + 1)), memoRows_(memoRows),
-        remember_(!backrefs && c.memo_ != MatchContext::Memo::kNever), pos_(start_) {}
+        remember_(!backrefs && c.memo_ != MatchContext::Memo::kNever),
+        stepLimit_(backrefs ? kBackrefStepLimit : kBackrefStepLimit / 10), pos_(start_) {}
 
   // True on a whole match; throws std::bad_alloc when memory runs out.
   bool run() {
@@ -59,7 +60,7 @@ class Matcher {
     std::int64_t resumesBeforeMemo = !remember_ || fromStart ? -1 : 2 * static_cast<std::int64_t>(n_) + 32;
     if (fromStart) startMemo();
     for (;;) {
-      if (!remember_ && ++steps_ > kBackrefStepLimit) return giveUp();
+      if (!remember_ && ++steps_ > stepLimit_) return giveUp();
       const PatternInst& in = code_[pc_];
       bool ok = true;
       if (memoOn_ && in.memo >= 0) {
@@ -327,7 +328,7 @@ class Matcher {
         case FrameKind::kAtomic: break;
         case FrameKind::kAlt:
         case FrameKind::kStar:
-          if (!remember_ && ++steps_ > kBackrefStepLimit) return giveUp();
+          if (!remember_ && ++steps_ > stepLimit_) return giveUp();
           if (resumesBeforeMemo > 0 && --resumesBeforeMemo == 0) startMemo();
           if (f.kind == FrameKind::kAlt ? resumeAlt(f) : resumeStar(f)) return true;
           continue;  // resumeStar popped a star with no end left
@@ -375,6 +376,7 @@ class Matcher {
   const bool spans_;
   const std::int32_t openBase_, memoRows_;
   const bool remember_;  // failed states may be remembered: no back-references, not plain mode
+  const std::int64_t stepLimit_;  // when not remembering
   bool memoOn_ = false;
   bool gaveUp_ = false;
   std::int64_t steps_ = 0;
