@@ -5,19 +5,17 @@
 // 128), then the pattern bytes, then the text (at most 512 bytes). Without back-references a
 // match costs at most program size x text length; with them the engine's step limit bounds it.
 //
-// Checks: a program exists exactly when the status says compiled; a match result has the
-// documented shape (1, N = group count, N + 1 ordered spans inside the text, group 0 the whole
-// text, -1 -1 for groups that took no part); matches() agrees with matchExact(); wholeMatch()
-// agrees with the engine for NUL-free patterns without flags; only a pattern with
-// back-references may give up, and giving up reports no match; rateStrength returns one of the
-// six letters.
+// Checks: a match result has the documented shape (1, N = group count, N + 1 ordered spans
+// inside the text, group 0 the whole text, -1 -1 for groups that took no part); matches()
+// agrees with matchExact(); the memo from the first step gives the spans of plain backtracking
+// (where that finishes within its step limit); only a pattern with back-references may give
+// up, and giving up reports no match; rateStrength returns one of the six letters.
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
 #include <string>
 
 #include "fuzz_support.h"
-#include "pattern/match.h"
 #include "pattern/pattern_engine.h"
 #include "pattern/strength.h"
 
@@ -57,20 +55,21 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   const auto* bytes = reinterpret_cast<const std::uint8_t*>(text.data());
 
   const tessel::PatternEngine engine(pattern.data(), pattern.size(), flags);
-  FUZZ_CHECK(engine.hasTree() == (engine.status() == tessel::PatternEngine::Status::kCompiled));
 
   tessel::MatchContext context;
   const tessel::MatchResult result = engine.matchExact(bytes, textLength, &context);
   FUZZ_CHECK(!context.gaveUp() || engine.hasBackrefs());
-  if (!engine.hasTree() || context.gaveUp()) FUZZ_CHECK(result.empty());
+  if (engine.status() != tessel::PatternEngine::Status::kCompiled || context.gaveUp()) FUZZ_CHECK(result.empty());
   checkResult(result, engine, textLength);
 
   tessel::MatchContext second;
   FUZZ_CHECK(engine.matches(bytes, textLength, &second) == !result.empty());
 
-  if (flags == 0 && std::memchr(pattern.data(), 0, pattern.size()) == nullptr) {
-    FUZZ_CHECK(tessel::wholeMatch(pattern.c_str(), bytes, textLength) == !result.empty());
-  }
+  tessel::MatchContext plain, always;
+  plain.setMemo(tessel::MatchContext::Memo::kNever);
+  always.setMemo(tessel::MatchContext::Memo::kAlways);
+  const tessel::MatchResult reference = engine.matchExact(bytes, textLength, &plain);
+  if (!plain.gaveUp()) FUZZ_CHECK(engine.matchExact(bytes, textLength, &always) == reference);
 
   FUZZ_CHECK(tessel_fuzz::isStrengthLetter(tessel::rateStrength(ruleSet, text.c_str())));
   return 0;

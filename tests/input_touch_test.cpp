@@ -187,7 +187,7 @@ TEST(TouchLimits, FillingTheWholeBuffer) {
   // Even with the limit bypassed, the store refuses to write past its capacity.
   s.maxLength = 32767;
   EXPECT_EQ(press(s, 150, 50), 0);
-  appendCharacter(*s.content, 'x', "[[:print:]]*");
+  appendCharacter(*s.content, 'x', *s.acceptsEngine);
   EXPECT_EQ(kb.length(), kContentCapacity);
   EXPECT_EQ(s.content->plaintext[kContentCapacity], 0);
 }

@@ -42,10 +42,7 @@ std::uint32_t toggled(std::uint32_t v) noexcept { return v == 0 ? 1 : 0; }
 void appendKey(KeyboardSession& s, std::uint8_t ch) noexcept {
   const auto length = static_cast<std::int16_t>(s.content->length.load());
   if (length >= s.maxLength) return;
-  if (s.acceptsEngine != nullptr)
-    appendCharacter(*s.content, ch, *s.acceptsEngine);
-  else
-    appendCharacter(*s.content, ch, s.accepts);  // no pattern, or no memory to keep it compiled
+  if (s.acceptsEngine != nullptr) appendCharacter(*s.content, ch, *s.acceptsEngine);  // else no pattern
 }
 
 // A character key of the full keyboard; `index` into the 26-key tables, or out of range when
@@ -212,12 +209,6 @@ void appendCharacter(ContentStore& store, std::uint8_t ch, const PatternEngine& 
   } else {
     text[n] = 0;
   }
-}
-
-void appendCharacter(ContentStore& store, std::uint8_t ch, const char* pattern) noexcept {
-  if (pattern == nullptr) return;
-  const PatternEngine accepts(pattern);
-  appendCharacter(store, ch, accepts);
 }
 
 void deleteLastCharacter(ContentStore& store) noexcept {

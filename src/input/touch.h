@@ -21,14 +21,12 @@ class PatternEngine;
 int touch(KeyboardSession& session, int action, float x, float y) noexcept;
 
 // Appends ch if the whole new text matches the compiled `accepts` (a malformed pattern matches
-// nothing, so nothing is appended); the second form compiles `pattern` for this call (null
-// appends nothing). The text is unsealed only inside the call
-// and resealed before it returns; a rejected character leaves the sealed bytes unchanged.
+// nothing, so nothing is appended). The text is unsealed only inside the call and resealed
+// before it returns; a rejected character leaves the sealed bytes unchanged.
 // The write position is `length` (the text holds no NUL that keys can produce, so this is its
 // string length); nothing is written once the 4092-character capacity is reached. The caller
 // applies maxLength.
 void appendCharacter(ContentStore& store, std::uint8_t ch, const PatternEngine& accepts) noexcept;
-void appendCharacter(ContentStore& store, std::uint8_t ch, const char* pattern) noexcept;
 
 // Removes the last character; nothing on empty content.
 void deleteLastCharacter(ContentStore& store) noexcept;

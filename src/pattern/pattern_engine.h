@@ -25,26 +25,34 @@
 //   that is not part of a well-formed {m}, {m,} or {m,n}, counts above 2147483647, a
 //   reversed range "[z-a]", an unknown class name such as "[:foo:]", a back-reference to a
 //   group that does not exist, a trailing backslash, an unterminated "(?#", a "[:" without
-//   its closing ":]". Nesting depth has no limit: parsing and matching use explicit stacks.
-//   A pattern whose program would pass kMaxProgram instructions (counted repetitions are
-//   expanded) is refused as kTooLarge.
+//   its closing ":]". Nesting depth has no limit of its own: parsing and matching use
+//   explicit stacks.
+// - A pattern whose program would weigh more than kMaxWeight is refused as kTooLarge (and so
+//   never matches). The weight is the sum over the instructions of their loop depth + 1 (4
+//   times that for a repeated byte or set with a choice of lengths); counted repetitions of
+//   anything else are expanded into copies of their body, so "(ab){500}" weighs 2001,
+//   "(a|b){0,80000}" and 30 nested loops "((…(a)*…)*)*" are refused, and "[a-z]{0,80000}"
+//   weighs 4. The bound keeps every match within interactive time and memory (below).
 // - Whole-text driver: the ways of matching are tried in order until one ends at the end of
-//   the text; the search also ends, without a match, when the second or a later way and the
-//   way right after it both end where matching began (the no-progress rule). That only
-//   matters for patterns with several empty ways, such as "(||)b*|a" against "a".
+//   the text. It keeps no rule over the ways it has seen: empty iterations end their loop
+//   (below), so the search always ends, and no alternative is made unreachable.
 // - Repetitions: mandatory iterations are all run, even when they consume nothing; an
 //   optional iteration that consumes nothing is kept but ends the loop (greedy, reluctant
 //   and possessive alike).
-// - Inside a set a backslash still escapes ("[\]\-]"), and \b there is backspace.
+// - Inside a set a backslash is a plain byte: "[a-z\]" is a to z and the backslash, "[\d]" the
+//   backslash and 'd'.
 // - '^' and \A match at offset 0; '$' and \Z at the end or before a final '\n'; \z at the
 //   end; \G at the position the match started from; \b and \B use \w (alnum and '_').
 // - A back-reference sees the group's last completed capture of the current way: inside its
 //   own group's first pass it is unset, and an unset group makes it fail.
 //
-// Cost: for a pattern without back-references a way's outcome from a given instruction and
-// position does not depend on how it got there, so the matcher remembers the (instruction,
-// position) states already found to fail and never explores one twice; time and memory are
-// bounded by program size x text length, with no step limit. Patterns with back-references
+// Cost: for a pattern without back-references a way's outcome from a given instruction,
+// position and loop progress does not depend on how it got there, so the matcher remembers the
+// states already found to fail and never explores one twice: time is bounded by weight x text
+// length, and the remembered states take one bit each (at most kMaxWeight x 4093 bits, 1 MiB,
+// for the longest content), with no step limit. Compiling takes time linear in the pattern
+// (a refused one stops writing its program at the bound); a compiled engine holds at most
+// kMaxWeight instructions. Patterns with back-references
 // cannot share states that way: they run plain backtracking limited to kBackrefStepLimit
 // steps (one per instruction executed or alternative resumed); a match that reaches the limit
 // reports no match (MatchContext::gaveUp() tells).
@@ -70,6 +78,7 @@ using MatchResult = std::vector<std::int32_t>;
 
 struct PatternInst;
 struct PatternFrame;
+class Matcher;
 
 // Per-call working state of a match: the backtracking stack, the captures and the table of
 // failed states. Reusable across matches (buffers keep their size); never share one between
@@ -81,26 +90,30 @@ class MatchContext {
   MatchContext(const MatchContext&) = delete;
   MatchContext& operator=(const MatchContext&) = delete;
 
+  // When failed states are remembered: kAuto once the search has backtracked about twice the
+  // text length; kAlways from the first step; kNever (plain backtracking). Outcome and spans are
+  // the same in every mode, except that kNever gives up after kBackrefStepLimit / 10 steps
+  // (without back-references); the last two let tests compare the memo with plain backtracking.
+  enum class Memo : std::uint8_t { kAuto, kAlways, kNever };
+  void setMemo(Memo memo) noexcept { memo_ = memo; }
+
   // The last match stopped on kBackrefStepLimit (reported as no match).
   bool gaveUp() const noexcept { return gaveUp_; }
-  // The last match ended on the no-progress rule of the whole-text driver.
-  bool stoppedWithoutProgress() const noexcept { return stopped_; }
   // Heap bytes the working state held at its largest, over this context's life.
   std::size_t peakBytes() const noexcept { return peakBytes_; }
-  // Updates peakBytes() after the matcher grew a buffer.
-  void noteBytes() noexcept;
 
  private:
   friend class PatternEngine;
+  friend class Matcher;
+  void noteBytes() noexcept;  // updates peakBytes() after the matcher grew a buffer
 
   std::vector<PatternFrame> stack_;
-  std::vector<std::int32_t> slots_;        // captures, then the open positions of groups
-  std::vector<std::uint8_t*> memoRows_;    // per branching instruction, allocated on first use
-  std::vector<std::int32_t> starData_;     // per single-byte repetition: run and failed targets
-  std::size_t memoBytes_ = 0;
+  std::vector<std::int32_t> slots_;     // captures, then the open positions of groups
+  std::vector<std::uint64_t> failed_;   // one bit per memo row and position, once the memo is on
+  std::vector<std::int32_t> starData_;  // per branching single-byte repetition: run, failed ends
   std::size_t peakBytes_ = 0;
+  Memo memo_ = Memo::kAuto;
   bool gaveUp_ = false;
-  bool stopped_ = false;
 };
 
 class PatternEngine {
@@ -108,7 +121,7 @@ class PatternEngine {
   static constexpr std::uint32_t kRightToLeft = 0x10;
   static constexpr std::uint32_t kExtended = 0x20;
   static constexpr std::int32_t kUnbounded = 2147483647;
-  static constexpr std::size_t kMaxProgram = std::size_t{1} << 20;  // instructions
+  static constexpr std::size_t kMaxWeight = 2048;  // see the header comment
 
   enum class Status : std::uint8_t { kCompiled, kEmptyPattern, kMalformed, kTooLarge, kNoMemory };
 
@@ -132,23 +145,22 @@ class PatternEngine {
   bool matches(const std::uint8_t* text, std::size_t length,
                MatchContext* context = nullptr) const noexcept;
 
-  bool hasTree() const noexcept { return compiled_; }
   Status status() const noexcept { return status_; }
   int groupCount() const noexcept { return groups_; }
   bool hasBackrefs() const noexcept { return backrefs_; }
 
  private:
-  void compile(const char* pattern, std::size_t length, std::uint32_t flags) noexcept;
+  void compile(const char* pattern, std::size_t length, std::uint32_t flags) noexcept;  // compiler
+  void markMemoPoints();                                                                 // compiler
   bool run(MatchContext& c, const std::uint8_t* text, std::size_t length, bool spans) const noexcept;
 
   std::vector<PatternInst> code_;
   std::vector<ByteSet> sets_;
   int groups_ = 0;
-  int memoPoints_ = 0;
-  int stars_ = 0;
+  std::int32_t memoRows_ = 0;  // rows of the memo, one per (memo point, loop progress)
+  std::int32_t stars_ = 0;
   int required_ = -1;  // a byte every match must contain, or -1
   bool backrefs_ = false;
-  bool compiled_ = false;
   bool rightToLeft_ = false;
   Status status_ = Status::kEmptyPattern;
 };

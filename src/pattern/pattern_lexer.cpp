@@ -5,7 +5,6 @@
 #include <cstring>
 
 #include "pattern/char_class.h"
-#include "pattern/pattern_engine.h"
 
 namespace tessel {
 
@@ -44,8 +43,8 @@ enum class CaseMode { kNone, kLower, kUpper };
 
 class Lexer {
  public:
-  Lexer(const char* p, std::size_t n, std::uint32_t flags, TokenList& out) noexcept
-      : p_(p), n_(n), extended_((flags & PatternEngine::kExtended) != 0), out_(out) {}
+  Lexer(const char* p, std::size_t n, bool extended, TokenList& out) noexcept
+      : p_(p), n_(n), extended_(extended), out_(out) {}
 
   bool run() noexcept {
     while (i_ < n_) {
@@ -110,8 +109,7 @@ class Lexer {
     const bool atStart = setStart_;
     setStart_ = false;
     if (c == '[' && i_ + 1 < n_ && p_[i_ + 1] == ':') return namedClass();
-    if (c == '\\') return escape();
-    ++i_;
+    ++i_;  // a backslash is a plain byte here
     if (c == ']') {
       depth_ = 0;
       return special(']');
@@ -143,7 +141,6 @@ class Lexer {
     if (i_ + 1 >= n_) return false;
     const char e = p_[i_ + 1];
     i_ += 2;
-    const bool inSet = depth_ != 0;
     switch (e) {
       case 'd': return classToken(NamedClass::kDigit, false);
       case 'D': return classToken(NamedClass::kDigit, true);
@@ -151,13 +148,9 @@ class Lexer {
       case 'S': return classToken(NamedClass::kSpace, true);
       case 'w': return classToken(NamedClass::kWord, false);
       case 'W': return classToken(NamedClass::kWord, true);
-      case 'b':
-        if (inSet) return rawByte(0x08);  // backspace inside a set, as usual
-        return assertion('b');
-      case 'A': case 'Z': case 'z': case 'B': case 'G':
-        if (inSet) return false;
+      case 'A': case 'Z': case 'z': case 'b': case 'B': case 'G':
         return assertion(static_cast<std::uint8_t>(e));
-      case 'g': case 'k': return backrefSyntax(inSet);
+      case 'g': case 'k': return backrefSyntax();
       case 'Q': quoting_ = true; return true;
       case 'E': caseMode_ = CaseMode::kNone; return true;
       case 'L': caseMode_ = CaseMode::kLower; return true;
@@ -179,8 +172,8 @@ class Lexer {
 
   // \gN \g{N} \g{-N} \kN \k{N} \k<N>: absolute group numbers, or relative to the groups
   // opened so far (every '(' opens a capturing group in this syntax).
-  bool backrefSyntax(bool inSet) noexcept {
-    if (inSet || i_ >= n_) return false;
+  bool backrefSyntax() noexcept {
+    if (i_ >= n_) return false;
     char close = 0;
     if (p_[i_] == '{') close = '}';
     if (p_[i_] == '<') close = '>';
@@ -194,7 +187,7 @@ class Lexer {
     std::size_t digits = 0;
     while (i_ < n_ && p_[i_] >= '0' && p_[i_] <= '9') {
       value = value * 10 + (p_[i_] - '0');
-      if (value > PatternEngine::kUnbounded) return false;
+      if (value > INT32_MAX) return false;
       ++i_;
       ++digits;
     }
@@ -265,9 +258,8 @@ class Lexer {
 
 }  // namespace
 
-bool lexPattern(const char* pattern, std::size_t length, std::uint32_t flags,
-                TokenList& out) noexcept {
-  Lexer lexer(pattern, length, flags, out);
+bool lexPattern(const char* pattern, std::size_t length, bool extended, TokenList& out) noexcept {
+  Lexer lexer(pattern, length, extended, out);
   return lexer.run();
 }
 

@@ -10,12 +10,12 @@
 // until \E. The bracket depth is tracked here so the parser never sees a '[' inside a set as
 // anything but a plain byte.
 //
-// Decisions where the syntax leaves room (documented in pattern_engine.h): a backslash also
-// escapes inside a bracket expression; \x takes up to two hex digits (none means NUL) or
+// Decisions where the syntax leaves room (documented in pattern_engine.h): inside a bracket
+// expression a backslash is a plain byte, like every byte but ']', '-', a leading '^' and "[:";
+// \x takes up to two hex digits (none means NUL) or
 // {hex} up to 0xFF; \u takes one to four hex digits up to 0xFF; \0..\9 stand for the digit. Anything
 // the lexer cannot read (unknown class name, unterminated "[:", "(?#" or \x{, trailing
-// backslash, \A-style assertions or back-references inside a set) makes the whole pattern
-// malformed.
+// backslash) makes the whole pattern malformed.
 #pragma once
 
 #include <cstddef>
@@ -52,8 +52,8 @@ class TokenList {
   std::size_t capacity_ = kInlineTokens;
 };
 
-// Tokenizes pattern[0, length). False when the pattern cannot be read or memory runs out.
-bool lexPattern(const char* pattern, std::size_t length, std::uint32_t flags,
-                TokenList& out) noexcept;
+// Tokenizes pattern[0, length), `extended` skipping white space and '#' comments outside sets.
+// False when the pattern cannot be read or memory runs out.
+bool lexPattern(const char* pattern, std::size_t length, bool extended, TokenList& out) noexcept;
 
 }  // namespace tessel

@@ -54,12 +54,6 @@ constexpr Rating kRatingOfRuleSet[91] = {
     G,                             // 90
 };
 
-bool wholeMatchOf(const char* pattern, const Text& t) noexcept {
-  const PatternEngine engine(pattern);
-  MatchContext context;
-  return engine.matches(t.bytes, t.n, &context);
-}
-
 bool isTrivialSequence(const Text& t) noexcept {
   return isAllSameChar(t.bytes, t.n) || isAscendingDigitRun(t.bytes, t.n) ||
          isDescendingDigitRun(t.bytes, t.n) || isAscendingLetterRun(t.bytes, t.n) ||
@@ -196,7 +190,7 @@ int verifyPassword(std::uint32_t ruleSet, const char* text, bool fullCheck,
   if (t.n < rule.minLength) return kVerifyTooShort;
   if (ruleSet == 36) {
     if (!hasClassMix(t)) return kVerifyPatternMismatch;
-  } else if (rule.acceptsPattern == nullptr || !wholeMatchOf(rule.acceptsPattern, t)) {
+  } else if (rule.accepts == nullptr || !rule.accepts->matches(t.bytes, t.n)) {
     return kVerifyPatternMismatch;
   }
   if (!fullCheck) return kVerifyPass;
@@ -260,7 +254,7 @@ bool buildPasswordRule(const KeyboardSession& session, PasswordRule* rule) noexc
   *rule = PasswordRule{};
   if (!parseDictionary(session.content->dictionaryFilter, &rule->dictionary)) return false;
   rule->minLength = static_cast<std::uint32_t>(static_cast<std::int32_t>(session.minLength));
-  rule->acceptsPattern = session.accepts;
+  rule->accepts = session.acceptsEngine;
   rule->requiredClasses = session.content->contentType;
   return true;
 }

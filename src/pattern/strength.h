@@ -12,6 +12,8 @@
 
 namespace tessel {
 
+class PatternEngine;
+
 struct KeyboardSession;
 
 // Degree letter 'E', 'W', 'M', 'S', 'T' or 'R' of text under a rule set (0..90; above: default).
@@ -48,14 +50,14 @@ constexpr std::uint32_t kRequirePunct = 4;
 // Built afresh for one verification and released right after it.
 struct PasswordRule {
   std::uint32_t minLength = 0;
-  const char* acceptsPattern = nullptr;  // borrowed (the session's accepts text), may be null
+  const PatternEngine* accepts = nullptr;  // borrowed (the session's compiled accepts), may be null
   std::uint32_t requiredClasses = 0;
   char** dictionary = nullptr;           // owned: null-terminated array of owned strings, or null
 };
 
 // Checks, in order: empty (-1); shorter than minLength (-2); the pattern step (-3: rule set
-// 36 requires a class mix, every other rule set a whole match of acceptsPattern compiled
-// afresh, a null pattern failing); then, only with fullCheck: trivial sequences for rule sets
+// 36 requires a class mix, every other rule set a whole match of `accepts`, a null pattern
+// failing); then, only with fullCheck: trivial sequences for rule sets
 // 60, 84 and 4 (-4), an exact dictionary entry (-5), a missing required class (-6). A null
 // text counts as empty.
 int verifyPassword(std::uint32_t ruleSet, const char* text, bool fullCheck,

@@ -64,7 +64,7 @@ std::uint16_t binaryModeOrZero(std::int16_t m) noexcept {
 }  // namespace
 
 // The key press matches the pattern against the whole text each time: it is compiled here, once
-// per setting, not per key. Without memory for it, key presses compile it themselves.
+// per setting, not per key. Without memory for it, no key is accepted, as with no pattern.
 void setAccepts(KeyboardSession& s, const char* pattern) noexcept {
   replaceOwnedText(s.accepts, pattern);
   delete s.acceptsEngine;

@@ -434,14 +434,17 @@ public final class QNKbdJniLib {
    * POSIX classes are written without the outer brackets, e.g. {@code "[:digit:]{0,6}"}.
    * Back-references are written {@code \g1} or {@code \k<1>}; {@code \1} is the digit 1.
    *
-   * <p>Cost: a pattern without back-references is decided exactly on every key, however it
-   * nests, in time bounded by the pattern's size (counted repetitions such as {@code {0,16}}
-   * count as their copies) times the text length: there is no step limit and no refusal of a
-   * text the pattern accepts. A pattern with back-references is searched with a limit of
-   * 1,000,000 steps (one per pattern instruction executed or alternative resumed) per key; a
-   * key whose check reaches the limit counts as not matching: the character is dropped, as is
-   * every later key while the limit is reached, and {@link #getNativeVerify} returns -3. A
-   * pattern whose counted repetitions expand beyond 1,048,576 instructions never matches.
+   * <p>Cost: a pattern without back-references is decided exactly on every key in time bounded
+   * by the pattern's weight times the text length: there is no step limit and no refusal of a
+   * text the pattern accepts. The weight counts each pattern element once per loop around it
+   * plus one, a repeated single character or class with a choice of lengths ({@code [a-z]{0,16}})
+   * as 4, and a counted repetition of a group as that many copies of the group. A pattern
+   * weighing more than 2048 (such as {@code (a|b){0,80000}}, or 30 nested loops) is refused:
+   * it never matches, so no character can be typed. A pattern with back-references is searched
+   * with a limit of 1,000,000 steps (one per pattern instruction executed or alternative
+   * resumed) per key; a key whose check reaches the limit counts as not matching: the character
+   * is dropped, as is every later key while the limit is reached, and {@link #getNativeVerify}
+   * returns -3.
    */
   public static native void setNativeAccepts(int handle, String pattern);
 
