@@ -35,7 +35,6 @@
 
 #include "crypto/codec.h"
 #include "crypto/error_table.h"
-#include "session/output.h"
 #include "crypto/moduli.h"
 #include "crypto/rsa.h"
 #include "crypto/sha1.h"
@@ -43,8 +42,8 @@
 #include "input/layout.h"
 #include "crypto/rand48.h"
 #include "input/touch.h"
-#include "pattern/strength.h"
 #include "session/output.h"
+#include "session/sealed_text.h"
 #include "session/session.h"
 #include "session/settings.h"
 

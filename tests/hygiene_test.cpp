@@ -17,10 +17,9 @@
 #include <string>
 #include <vector>
 
-#include "session/output.h"
 #include "input/layout.h"
-#include "pattern/strength.h"
 #include "session/output.h"
+#include "session/sealed_text.h"
 #include "session/session.h"
 #include "session/settings.h"
 #include "server/password_check.h"

@@ -7,6 +7,7 @@
 
 #include "input/layout.h"
 #include "input/touch.h"
+#include "session/sealed_text.h"
 #include "session/session.h"
 #include "session/settings.h"
 #include "support/keyboard_typist.h"

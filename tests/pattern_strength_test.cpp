@@ -10,6 +10,7 @@
 
 #include "pattern/pattern_engine.h"
 #include "pattern/strength.h"
+#include "session/sealed_text.h"
 #include "session/session.h"
 #include "session/settings.h"
 #include "support/keyboard_typist.h"

@@ -1,15 +1,15 @@
-// Touch dispatch: hit-testing against the key grid and editing of the sealed content.
+// Touch dispatch: hit-testing against the key grid.
 //
-// Exposes touch, appendCharacter and deleteLastCharacter (input/touch.h). Private: the two
-// keyboard dispatchers and the coordinate-to-cell conversion. Presses act only on release; a
-// down or move just sets the highlight flags that the renderer reads. The typed text is touched
-// only inside a ContentGuard, so it is plain only for the duration of one edit.
+// Exposes touch (input/touch.h). Private: the two keyboard dispatchers and the
+// coordinate-to-cell conversion. Presses act only on release; a down or move just sets the
+// highlight flags that the renderer reads. A character or delete key is handed to the
+// session's text operations (session/sealed_text.h), which alone open the seal.
 #include "input/touch.h"
 
 #include <cstddef>
 #include <cstdint>
 
-#include "pattern/pattern_engine.h"
+#include "session/sealed_text.h"
 #include "session/session.h"
 
 namespace tessel {
@@ -194,29 +194,6 @@ int touch(KeyboardSession& session, int action, float x, float y) noexcept {
   if (!done) return 0;
   if (session.finishMode == 0) session.layoutBuilt = 0;
   return 1;
-}
-
-void appendCharacter(ContentStore& store, std::uint8_t ch, const PatternEngine& accepts) noexcept {
-  if (store.length >= kContentCapacity) return;
-  ContentGuard guard(store);
-  std::uint8_t* text = guard.text();
-  const std::size_t n = store.length;
-  text[n] = ch;
-  text[n + 1] = 0;
-  MatchContext context;
-  if (accepts.matches(text, n + 1, &context)) {
-    store.length = static_cast<std::uint16_t>(n + 1);
-  } else {
-    text[n] = 0;
-  }
-}
-
-void deleteLastCharacter(ContentStore& store) noexcept {
-  if (store.length == 0) return;
-  ContentGuard guard(store);
-  const std::size_t n = store.length;
-  guard.text()[n - 1] = 0;
-  store.length = static_cast<std::uint16_t>(n - 1);
 }
 
 }  // namespace tessel

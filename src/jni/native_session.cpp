@@ -13,14 +13,13 @@
 #include <cstdint>
 
 #include "crypto/error_table.h"
-#include "session/output.h"
+#include "input/touch.h"
 #include "jni/jni_support.h"
 #include "jni/version.h"
-#include "pattern/strength.h"
 #include "render/surfaces.h"
 #include "session/output.h"
+#include "session/sealed_text.h"
 #include "session/session.h"
-#include "input/touch.h"
 
 using tessel::KeyboardSession;
 using tessel::Access;

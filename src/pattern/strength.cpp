@@ -1,10 +1,10 @@
-// Strength ratings, rule verification, the dictionary list and the session operations.
+// Strength ratings, rule verification and the dictionary list, over a text the caller shows.
 //
 // The rule-set table is data: one rating per rule set 0..90. The general rating compares
 // the runs with the ceiling of half the length, the numeric-aware one with the floor: the two
 // thresholds differ on purpose. The default rating's two fixed patterns are compiled once per
-// process, like the class predicates of password_measures.cpp; the accepts check of
-// verification compiles the session's pattern per call (on this frame).
+// process, like the class predicates of password_measures.cpp; verification borrows the accepts
+// pattern its caller compiled.
 #include "pattern/strength.h"
 
 #include <cstdlib>
@@ -14,7 +14,6 @@
 #include "pattern/char_class.h"
 #include "pattern/password_measures.h"
 #include "pattern/pattern_engine.h"
-#include "session/session.h"
 
 namespace tessel {
 
@@ -250,39 +249,9 @@ void freeDictionary(char** list) noexcept {
   std::free(list);
 }
 
-bool buildPasswordRule(const KeyboardSession& session, PasswordRule* rule) noexcept {
-  *rule = PasswordRule{};
-  if (!parseDictionary(session.content->dictionaryFilter, &rule->dictionary)) return false;
-  rule->minLength = static_cast<std::uint32_t>(static_cast<std::int32_t>(session.minLength));
-  rule->accepts = session.acceptsEngine;
-  rule->requiredClasses = session.content->contentType;
-  return true;
-}
-
 void releasePasswordRule(PasswordRule& rule) noexcept {
   freeDictionary(rule.dictionary);
   rule = PasswordRule{};
-}
-
-// ---- session operations
-
-char sessionDegree(KeyboardSession& session) {
-  ContentGuard guard(*session.content);
-  guard.text()[guard.length()] = 0;  // already the terminator; stated, not assumed
-  return rateStrength(48, reinterpret_cast<const char*>(guard.text()));
-}
-
-int sessionVerify(KeyboardSession& session) {
-  PasswordRule rule;
-  if (!buildPasswordRule(session, &rule)) return kVerifyTrivial;
-  int code;
-  {
-    ContentGuard guard(*session.content);
-    guard.text()[guard.length()] = 0;
-    code = verifyPassword(48, reinterpret_cast<const char*>(guard.text()), true, rule);
-  }
-  releasePasswordRule(rule);
-  return code;
 }
 
 }  // namespace tessel

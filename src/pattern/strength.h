@@ -4,8 +4,8 @@
 // 'M' medium, 'S' strong, 'T' trivial, 'R' repetitive. Rule sets 0..90 pick one of five
 // ratings from a fixed table (strength.cpp); anything else (as unsigned 32-bit) uses the
 // default rating. verifyPassword checks a text against a PasswordRule and returns 0 or a
-// negative reason code (kVerify* below). Both read the text only; the session operations
-// unseal the content around them and reseal it (ContentGuard).
+// negative reason code (kVerify* below). Both read a text they are shown and keep nothing of it
+// (session/sealed_text.h shows them the sealed text).
 #pragma once
 
 #include <cstdint>
@@ -14,16 +14,9 @@ namespace tessel {
 
 class PatternEngine;
 
-struct KeyboardSession;
-
 // Degree letter 'E', 'W', 'M', 'S', 'T' or 'R' of text under a rule set (0..90; above: default).
 // A null text counts as empty.
 char rateStrength(std::uint32_t ruleSet, const char* text);
-
-// Session operations behind getNativeDegree (rule set 48) and getNativeVerify (48, full check):
-// both unseal and reseal the content themselves.
-char sessionDegree(KeyboardSession& session);
-int sessionVerify(KeyboardSession& session);
 
 // ---- the individual ratings (texts NUL-terminated; null counts as empty)
 
@@ -73,10 +66,7 @@ bool parseDictionary(const char* text, char*** out) noexcept;
 // Wipes and frees every string of the list, then the list; null is accepted.
 void freeDictionary(char** list) noexcept;
 
-// The rule of a session: minLength, accepts, the store's contentType and dictionary list.
-// False (nothing to release) when the dictionary cannot be allocated or the session has no
-// content store.
-bool buildPasswordRule(const KeyboardSession& session, PasswordRule* rule) noexcept;
+// Frees the rule's dictionary and resets it.
 void releasePasswordRule(PasswordRule& rule) noexcept;
 
 }  // namespace tessel

@@ -17,16 +17,15 @@
 #include <sys/stat.h>
 
 #include "crypto/error_table.h"
-#include "session/output.h"
 #include "crypto/moduli.h"
 #include "input/touch.h"
 #include "offscreen.h"
-#include "pattern/strength.h"
 #include "render/surfaces.h"
 #include "road.h"
 #include "server/bytes.h"
 #include "server/password_check.h"
 #include "session/output.h"
+#include "session/sealed_text.h"
 #include "session/session.h"
 #include "typist.h"
 #if TESSEL_DEMO_WINDOW

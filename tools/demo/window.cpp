@@ -17,11 +17,11 @@
 #include "crypto/error_table.h"
 #include "input/touch.h"
 #include "offscreen.h"
-#include "pattern/strength.h"
 #include "render/surfaces.h"
 #include "render/textures.h"
 #include "road.h"
 #include "session/output.h"
+#include "session/sealed_text.h"
 #include "session/session.h"
 
 namespace demo {
