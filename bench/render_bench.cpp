@@ -260,7 +260,7 @@ double residentMiB() {
 // all three surfaces created, changed and drawn once per round, `rounds` rounds in one context.
 // Reports how much the resident memory grew from the end of the first round to the last.
 void BM_TextureGrowth(benchmark::State& state) {
-  tessel::test::GlesContext gl(1080, 720);
+  tessel::host::GlesContext gl(1080, 720);
   const int handle = tessel::createSession("bench-growth");
   KeyboardSession* s = tessel::sessionAt(handle);
   if (s == nullptr || !gl.ok()) {
