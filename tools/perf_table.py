@@ -197,7 +197,7 @@ def worst_row(runs, what, program, ours_prefix, peer_prefix, peer_label, target,
     return f"| {what} | {ours} | {peer_label} {' / '.join(peer)} | | {target} |"
 
 
-def table(runs, meta):
+def table(runs, meta, extra_rows=()):
     lines = ["| What (`bench/…`) | Ours | Peer | Ratio | Target |", "|---|---|---|---|---|"]
     used, seen_programs = set(), set()
     for what, program, ours_name, peer_name, peer_label, metric, target in ROWS:
@@ -273,7 +273,7 @@ def table(runs, meta):
             ratio = spread(paired(ours, peer, lambda a, b: cpu_ns(a) / cpu_ns(b)), times)
             lines.append(f"| {label} | {spread([cpu_ns(b) for b in ours], duration)} | {peer_label} "
                          f"{spread([cpu_ns(b) for b in peer], duration)} | {ratio} time | {target} |")
-    lines += size_row(meta)
+    lines += list(extra_rows) + size_row(meta)
     others = sorted(k for k in runs if k not in used)
     if others:
         lines.append("")
@@ -306,7 +306,7 @@ def main():
         f"ours and the peer in the same program; CPU time per operation, ratios per repetition; a range "
         f"(min–max) where the repetitions differ by more than {SPREAD:.0%}.",
         "",
-    ] + table(runs, meta) + java_timing_rows(run_dir) + [
+    ] + table(runs, meta, java_timing_rows(run_dir)) + [
         "",
         "Each program first prints Google Benchmark's \"Library was built as DEBUG\" warning: Debian's "
         "libbenchmark package is built without `NDEBUG`; the timed loop is inlined from its header into our "
