@@ -151,8 +151,8 @@ class SessionRef {
 
 // ---- the sealed text
 
-// RC4 with a fresh schedule of kSealKey over the first `length` bytes, in place. Sealing and
-// unsealing are the same operation.
+// RC4 under kSealKey over the first `length` bytes, in place, from a copy of the schedule made
+// at creation (cipherState), wiped after use. Sealing and unsealing are the same operation.
 void applySeal(ContentStore& store) noexcept;
 
 // Scoped access to the plaintext: unseals on entry if length != 0 and, on every way out,
